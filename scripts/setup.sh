@@ -9,7 +9,7 @@ PKGS=(
   libstb-dev
   opencv-data python3-opencv libopencv-objdetect-dev libopencv-imgproc-dev libopencv-imgcodecs-dev
   libdlib-dev libdlib-data
-  ffmpeg nodejs npm
+  ffmpeg nodejs npm opencv-doc
 )
 missing=()
 for p in "${PKGS[@]}"; do
