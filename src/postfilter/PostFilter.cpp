@@ -1,0 +1,3 @@
+#include "postfilter/PostFilter.h"
+
+PostFilter::~PostFilter() = default;
