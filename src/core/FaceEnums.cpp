@@ -1,0 +1,48 @@
+#include "core/FaceEnums.h"
+
+#include "core/Json.h"
+
+namespace {
+
+// Labels in order of value, starting at -1.
+const char* const kAgeIntervalLabels[] = {"ageIntervalNone", "ageInterval0", "ageInterval1",
+                                          "ageInterval2",    "ageInterval3", "ageInterval4"};
+const char* const kRaceLabels[] = {"raceNone", "race0", "race1", "race2", "race3"};
+const char* const kGenderLabels[] = {"genderNone", "gender0", "gender1"};
+const char* const kPoseLabels[] = {"poseNone", "pose0", "pose1", "pose2", "pose3", "pose4", "pose5", "pose6"};
+
+template <std::size_t N>
+std::string labelOf(int32_t value, const char* const (&labels)[N]) {
+    // Compare in 64 bits so that no value wraps into the range.
+    int64_t index = static_cast<int64_t>(value) + 1;
+    if (index < 0 || index >= static_cast<int64_t>(N)) throw JsonError(kJsonSerializationError);
+    return std::string("\"") + labels[index] + "\"";
+}
+
+template <std::size_t N>
+int32_t valueOf(const std::string& text, const char* const (&labels)[N]) {
+    for (std::size_t i = 0; i < N; ++i) {
+        if (text == std::string("\"") + labels[i] + "\"") return static_cast<int32_t>(i) - 1;
+    }
+    throw JsonError(kJsonDeserializationError);
+}
+
+}  // namespace
+
+std::string FaceAgeInterval::toJson() const { return labelOf(value, kAgeIntervalLabels); }
+void FaceAgeInterval::fromJson(const std::string& text) { value = valueOf(text, kAgeIntervalLabels); }
+
+std::string FaceRace::toJson() const { return labelOf(value, kRaceLabels); }
+void FaceRace::fromJson(const std::string& text) { value = valueOf(text, kRaceLabels); }
+
+std::string FaceGender::toJson() const { return labelOf(value, kGenderLabels); }
+void FaceGender::fromJson(const std::string& text) { value = valueOf(text, kGenderLabels); }
+
+std::string FacePose::toJson() const { return labelOf(value, kPoseLabels); }
+void FacePose::fromJson(const std::string& text) { value = valueOf(text, kPoseLabels); }
+
+FacePose FacePose::flip() const {
+    static const int32_t kMirror[] = {-1, 0, 2, 1, 4, 3, 6, 5};
+    if (value < -1 || value > 6) throw JsonError("Invalid pose");
+    return FacePose(kMirror[value + 1]);
+}
