@@ -1,0 +1,46 @@
+#ifndef QUORIN_API_FACEDETECTIONPIPELINE_H
+#define QUORIN_API_FACEDETECTIONPIPELINE_H
+
+#include <vector>
+
+#include "api/DetectionRequest.h"
+#include "core/FaceRecord.h"
+#include "detector/FaceTrackingMode.h"
+
+class FaceDetector;
+class FacePartLocator;
+class FaceModelPaths;
+
+// Owns the detector and the part locator and runs them on one frame, in that
+// order. Empty (both null) after construction, release and a failed init.
+class FaceDetectionPipeline {
+public:
+    FaceDetectionPipeline() = default;
+    ~FaceDetectionPipeline();
+    FaceDetectionPipeline(const FaceDetectionPipeline&) = delete;
+    FaceDetectionPipeline& operator=(const FaceDetectionPipeline&) = delete;
+
+    // Builds both engines from the "faceRects" and "faceParts" entries of the
+    // configuration's detection text, releasing any earlier ones first. On
+    // failure the pipeline is left empty and ApiError
+    // "QVFace Detection API initialization error" is raised.
+    void init(const FaceModelPaths& paths);
+    void release();
+
+    // Forwarded to the detector; without one they raise qv_operation_error.
+    void setTrackingMode(QVFaceTrackingMode mode);
+    void setSearchStep(float stepX, float stepY);
+    void setFaceSizeRange(int minSize, int maxSize);
+
+    // Faces of one frame with landmarks and the request's dataSet/filePath.
+    // The locator is not run on a frame without faces.
+    std::vector<FaceRecord> detect(const DetectionRequest& request);
+
+    bool ready() const { return detector_ != nullptr && locator_ != nullptr; }
+
+private:
+    FaceDetector* detector_ = nullptr;
+    FacePartLocator* locator_ = nullptr;
+};
+
+#endif

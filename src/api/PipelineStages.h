@@ -1,0 +1,28 @@
+#ifndef QUORIN_API_PIPELINESTAGES_H
+#define QUORIN_API_PIPELINESTAGES_H
+
+#include <vector>
+
+#include "core/FaceData.h"
+#include "detector/FaceTrackingMode.h"
+
+// A stand-in for the detector and the part locator of every pipeline. While
+// one is installed, FaceDetectionPipeline sends the setters, detect and
+// locateParts to it instead of its own engines, so that the road from a list
+// of faces to the host's result blocks can be driven with chosen faces.
+// Internal to the library: never exported.
+class PipelineStages {
+public:
+    virtual ~PipelineStages() = default;
+    virtual void setTrackingMode(QVFaceTrackingMode) {}
+    virtual void setSearchStep(float, float) {}
+    virtual void setFaceSizeRange(int, int) {}
+    virtual void detect(const unsigned char* pixels, int width, int height, std::vector<FaceData>& faces) = 0;
+    virtual void locateParts(const unsigned char*, int, int, std::vector<FaceData>&) {}
+};
+
+// Installs `stages` (not owned) for all pipelines; null restores the engines.
+void setPipelineStagesOverride(PipelineStages* stages);
+PipelineStages* pipelineStagesOverride();
+
+#endif
