@@ -2,8 +2,10 @@
 
 #include <cstring>
 
+#include "core/Descramble.h"
 #include "core/Errors.h"
 #include "core/ModelRegistry.h"
+#include "core/ScrambledTexts.h"
 
 namespace {
 const char* const kRawModeUnsupported = "The reader does not support raw mode loading";
@@ -18,7 +20,7 @@ ModelReader::ModelReader(const std::string& path, int mode)
     const uint8_t* begin = nullptr;
     const uint8_t* end = nullptr;
     if (!ModelRegistry::instance().findModel(parsed.first, begin, end))
-        throw qv_data_error("Model not found: " + parsed.first);
+        throw qv_data_error(descrambleText(scrambled::kModelNotFound));
 
     if (mode == IVB) throw qv_unsupported_error("IVB model containers are not supported by this reader");
 

@@ -1,0 +1,93 @@
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <sstream>
+
+#include "core/Descramble.h"
+#include "core/ScrambledTexts.h"
+#include "support/SourceTree.h"
+
+namespace {
+
+// Stored form of `plain` as the generator makes it.
+std::string scrambleWithTool(const std::string& plain) {
+    const std::string command =
+        sourcetree::python() + " '" + sourcetree::path("tools/scramble_text.py") + "' --text '" + plain + "'";
+    FILE* pipe = popen(command.c_str(), "r");
+    if (!pipe) return "";
+    std::string out;
+    char buffer[256];
+    while (fgets(buffer, sizeof buffer, pipe)) out += buffer;
+    pclose(pipe);
+    // One C literal per line: "....", with \" for quotes.
+    if (out.size() < 3) return "";
+    std::string literal = out.substr(1, out.find_last_of('"') - 1);
+    std::string stored;
+    for (std::size_t i = 0; i < literal.size(); ++i) {
+        if (literal[i] == '\\' && i + 1 < literal.size()) ++i;
+        stored += literal[i];
+    }
+    return stored;
+}
+
+}  // namespace
+
+TEST(Descramble, RestoresWhatTheGeneratorStores) {
+    for (const std::string plain : {"Hello World", "Model data truncated", "leftEye", "a-Z_0 9.", "zzzzzzzzzzzzzzzz",
+                                    "QVFace \"quoted\" text: 100%"}) {
+        const std::string stored = scrambleWithTool(plain);
+        ASSERT_FALSE(stored.empty()) << "scramble_text.py did not run";
+        EXPECT_NE(stored, plain);
+        EXPECT_EQ(descrambleText(stored.c_str()), plain);
+    }
+}
+
+TEST(Descramble, ShiftDependsOnOutputPosition) {
+    // The same stored letter restores differently at different positions, and a
+    // blank keeps its place while still counting as a position.
+    const std::string twice = descrambleText("aa");
+    EXPECT_NE(twice[0], twice[1]);
+    EXPECT_EQ(descrambleText(" a")[1], descrambleText("xa")[1]);
+    EXPECT_EQ(descrambleText(" a")[0], ' ');
+    EXPECT_NE(descrambleText(" a")[1], descrambleText("a")[0]);
+    EXPECT_EQ(scrambleAlphabetLength, 62u);
+}
+
+TEST(Descramble, BackslashIsDroppedAndTakesNoPosition) {
+    EXPECT_EQ(descrambleText("a\\b"), descrambleText("ab"));
+    EXPECT_EQ(descrambleText("\\\\"), "");
+    EXPECT_EQ(descrambleText("ab\\").size(), 2u);
+}
+
+TEST(Descramble, LongAndEmptyTexts) {
+    const std::string long1024(1024, 'q');
+    EXPECT_EQ(descrambleText(long1024.c_str()), long1024);
+    const std::string long1023(1023, 'q');
+    const std::string restored = descrambleText(long1023.c_str());
+    EXPECT_EQ(restored.size(), 1023u);
+    EXPECT_NE(restored, long1023);
+    EXPECT_EQ(descrambleText(""), "");
+    EXPECT_EQ(descrambleText(nullptr), "");
+    EXPECT_EQ(descrambleText("+-/ ,.:"), "+-/ ,.:");
+}
+
+TEST(ScrambledTextTable, HeaderMatchesItsTable) {
+    // Each row of the table restores to its plain text, and the generated header
+    // is what the generator makes from the table today.
+    std::istringstream table(sourcetree::readText(sourcetree::path("src/core/ScrambledTexts.txt")));
+    std::map<std::string, std::string> plain;
+    for (std::string line; std::getline(table, line);) {
+        const std::size_t tab = line.find('\t');
+        if (line.empty() || line[0] == '#' || tab == std::string::npos) continue;
+        plain[line.substr(0, tab)] = line.substr(tab + 1);
+    }
+    ASSERT_FALSE(plain.empty());
+    EXPECT_EQ(descrambleText(scrambled::kModelNotFound), plain["kModelNotFound"]);
+    EXPECT_EQ(descrambleText(scrambled::kConfigurationLoadFailed), plain["kConfigurationLoadFailed"]);
+    EXPECT_EQ(descrambleText(scrambled::kFaceRecordReadFailed), plain["kFaceRecordReadFailed"]);
+
+    const std::string command = sourcetree::python() + " '" + sourcetree::path("tools/scramble_text.py") +
+                                "' --check --table '" + sourcetree::path("src/core/ScrambledTexts.txt") +
+                                "' --header '" + sourcetree::path("src/core/ScrambledTexts.h") + "'";
+    EXPECT_EQ(std::system(command.c_str()), 0) << "regenerate src/core/ScrambledTexts.h";
+}

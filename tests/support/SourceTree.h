@@ -1,0 +1,51 @@
+#ifndef QUORIN_TESTS_SOURCETREE_H
+#define QUORIN_TESTS_SOURCETREE_H
+
+#include <cstdint>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
+#include <string>
+#include <vector>
+
+// Paths into the source tree and small file helpers for tests that check
+// generated or embedded data against its source.
+namespace sourcetree {
+
+inline std::string root() {
+    const char* dir = std::getenv("QUORIN_SOURCE_DIR");
+    return dir ? std::string(dir) : std::string(".");
+}
+
+inline std::string path(const std::string& relative) { return root() + "/" + relative; }
+
+inline std::vector<uint8_t> readBytes(const std::string& file) {
+    std::ifstream in(file, std::ios::binary);
+    return std::vector<uint8_t>((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+}
+
+inline std::string readText(const std::string& file) {
+    std::ifstream in(file, std::ios::binary);
+    return std::string((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+}
+
+inline void writeText(const std::string& file, const std::string& text) {
+    std::ofstream out(file, std::ios::binary);
+    out << text;
+}
+
+// A fresh scratch directory under the build tree (or /tmp).
+inline std::string scratchDir(const std::string& name) {
+    const char* build = std::getenv("QUORIN_BINARY_DIR");
+    const std::string dir = std::string(build ? build : "/tmp") + "/test-scratch/" + name;
+    const std::string command = "rm -rf '" + dir + "' && mkdir -p '" + dir + "'";
+    if (std::system(command.c_str()) != 0) return "/tmp";
+    return dir;
+}
+
+// The Python that tools run with (stdlib only is needed by the text and model tools).
+inline std::string python() { return "/usr/bin/python3"; }
+
+}  // namespace sourcetree
+
+#endif
