@@ -1,0 +1,151 @@
+#include "Options.h"
+
+#include <cerrno>
+#include <cstdlib>
+
+#include "ImageIo.h"
+
+namespace qcli {
+namespace {
+
+bool parseInt(const std::string& text, long lo, long hi, int& out) {
+  if (text.empty() || text.size() > 12) return false;
+  const char* begin = text.c_str();
+  if (*begin != '-' && (*begin < '0' || *begin > '9')) return false;
+  char* end = nullptr;
+  errno = 0;
+  long v = std::strtol(begin, &end, 10);
+  if (errno != 0 || *end != '\0' || v < lo || v > hi) return false;
+  out = static_cast<int>(v);
+  return true;
+}
+
+}  // namespace
+
+void parseFrameSize(const std::string& text, int maxSide, int& width, int& height) {
+  auto x = text.find_first_of("xX");
+  if (x == std::string::npos || !parseInt(text.substr(0, x), 1, maxSide, width) ||
+      !parseInt(text.substr(x + 1), 1, maxSide, height))
+    throw UsageError("--raw wants WIDTHxHEIGHT with each side in 1.." + std::to_string(maxSide) + ", not '" + text +
+                     "'");
+}
+
+Options parseOptions(const std::vector<std::string>& args) {
+  Options o;
+  bool modeGiven = false;
+  for (std::size_t i = 0; i < args.size(); ++i) {
+    std::string arg = args[i];
+    std::string value;
+    bool hasInline = false;
+    if (arg.size() > 2 && arg.compare(0, 2, "--") == 0) {
+      auto eq = arg.find('=');
+      if (eq != std::string::npos) {
+        value = arg.substr(eq + 1);
+        arg = arg.substr(0, eq);
+        hasInline = true;
+      }
+    }
+    auto takeValue = [&]() -> std::string {
+      if (hasInline) return value;
+      if (i + 1 >= args.size()) throw UsageError(arg + " needs a value");
+      return args[++i];
+    };
+    auto noValue = [&]() {
+      if (hasInline) throw UsageError(arg + " takes no value");
+    };
+    if (arg == "-h" || arg == "--help") {
+      o.help = true;
+      return o;
+    } else if (arg == "--mode") {
+      std::string v = takeValue();
+      if (!parseInt(v, 0, 2, o.mode)) throw UsageError("--mode wants 0, 1 or 2, not '" + v + "'");
+      modeGiven = true;
+    } else if (arg == "--rotation") {
+      std::string v = takeValue();
+      if (!parseInt(v, 0, 270, o.rotation) || o.rotation % 90 != 0)
+        throw UsageError("--rotation wants 0, 90, 180 or 270, not '" + v + "'");
+      o.rotationGiven = true;
+    } else if (arg == "--scaled") {
+      noValue();
+      o.scaled = true;
+    } else if (arg == "--360") {
+      noValue();
+      o.search360 = true;
+    } else if (arg == "--max-faces") {
+      std::string v = takeValue();
+      if (!parseInt(v, 1, 100, o.maxFaces)) throw UsageError("--max-faces wants 1..100, not '" + v + "'");
+    } else if (arg == "--annotate") {
+      o.annotatePath = takeValue();
+      if (o.annotatePath.empty()) throw UsageError("--annotate needs a file name");
+    } else if (arg == "--raw") {
+      parseFrameSize(takeValue(), kMaxImageSide, o.rawWidth, o.rawHeight);
+      o.raw = true;
+    } else if (arg == "--annotate-raw") {
+      noValue();
+      o.annotateRaw = true;
+    } else if (arg == "--json") {
+      o.jsonPath = takeValue();
+      if (o.jsonPath.empty()) throw UsageError("--json needs a file name");
+    } else if (arg == "--") {
+      for (++i; i < args.size(); ++i) o.images.push_back(args[i]);
+    } else if (arg.size() > 1 && arg[0] == '-') {
+      throw UsageError("unknown option '" + arg + "'");
+    } else {
+      o.images.push_back(arg);
+    }
+  }
+
+  if (o.raw && !o.images.empty()) throw UsageError("give either image files or --raw, not both");
+  if (!o.raw && o.images.empty()) throw UsageError("no input: give image files, or --raw WxH with frames on stdin");
+  if (o.raw && !o.annotatePath.empty()) throw UsageError("--annotate is for images; use --annotate-raw with --raw");
+  if (o.annotateRaw && !o.raw) throw UsageError("--annotate-raw needs --raw");
+  if (!o.annotatePath.empty() && o.images.size() != 1) throw UsageError("--annotate takes exactly one image");
+  if (o.search360 && o.rotationGiven) throw UsageError("--360 searches the rotation itself; drop --rotation");
+  if (o.search360 && modeGiven) throw UsageError("--360 chooses its own mode; drop --mode");
+  if (o.search360 && !o.scaled && (o.annotateRaw || !o.annotatePath.empty()))
+    throw UsageError("annotating with --360 needs --scaled (only scaled results are on the frame's own axes)");
+  return o;
+}
+
+std::string usageText() {
+  return R"(Usage: quorin-detect [OPTIONS] IMAGE...
+       quorin-detect [OPTIONS] --raw WxH < frames
+
+Finds faces with libquorinapi. Images (JPEG, PNG, binary PGM/PPM) are turned to
+gray and detected one by one; each gives one JSON line on stdout:
+  {"file":..,"width":..,"height":..,"entry":..,"coordinates":..,"faces":[
+    {"rect":{"left","top","right","bottom"},
+     "landmarks":{"leftEye":[x,y],"rightEye","nose","leftMouthCorner","rightMouthCorner"},
+     "roll":degrees}]}
+"coordinates" is "frame" (pixels of the frame turned by the rotation) or
+"scaled" (-1000..1000 on the axes of the frame as given).
+
+With --raw WxH, stdin carries consecutive 8-bit gray frames of W*H bytes (as
+`ffmpeg -i clip.mp4 -f rawvideo -pix_fmt gray -` writes them); the frames go
+through the tracking mode one after the other, one JSON line per frame, and a
+progress line goes to stderr when it is a terminal.
+
+Options:
+  --mode 0|1|2       0 fast (long side 240), 1 tracking (320), 2 high (640);
+                     default 2 for images, 1 for --raw
+  --rotation DEG     turn the frame clockwise by 0, 90, 180 or 270 first
+  --scaled           report -1000..1000 on the frame's own axes
+                     (quorin_detectScaled and the Scaled 360 entries)
+  --360              let the engine find the rotation: images use
+                     quorin_detect360High, --raw uses quorin_detect360Tracking;
+                     with --scaled the Scaled entries, and the stream reports
+                     the orientation found
+  --max-faces N      report at most N faces (1..100, default 100)
+  --annotate OUT.png draw rectangles and landmarks onto the image (one image)
+  --annotate-raw     with --raw: write the frames, annotated, to stdout
+                     (JSON then only goes to --json FILE)
+  --json FILE        write the JSON lines to FILE instead of stdout
+  -h, --help         show this text
+
+Exit status: 0 all inputs done, 1 an input or output failed (unreadable or
+corrupt image, truncated stream, unwritable file), 2 bad usage, 3 the engine
+failed.
+)";
+}
+
+}  // namespace qcli
