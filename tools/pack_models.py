@@ -11,6 +11,7 @@ SHA-256, so the output is reproducible.
 import argparse
 import hashlib
 import os
+import re
 import sys
 
 
@@ -38,6 +39,10 @@ def main(argv=None):
              ".section .rodata", ".balign 16"]
     for path in args.payloads:
         name = os.path.splitext(os.path.basename(path))[0]
+        # The name becomes an assembler symbol and a registry name, which
+        # only ever holds letters, digits and underscores.
+        if not re.fullmatch(r"[A-Za-z_][A-Za-z0-9_]*", name):
+            ap.error("payload name %r is not a valid model name" % name)
         with open(path, "rb") as f:
             packed = pack(f.read())
         out = os.path.join(args.out_dir, name + ".packed")
