@@ -42,6 +42,11 @@ public:
 
     HaarFeature(HaarFeature const&) = delete;
     HaarFeature& operator=(HaarFeature const&) = delete;
+    HaarFeature(HaarFeature&& other) noexcept : count(other.count), rects(other.rects)
+    {
+        other.count = 0;
+        other.rects = nullptr;
+    }
 
     // Reads a rectangle count and the rectangles. Throws qv_data_error when
     // the count is negative or above kMaxRects, or a rectangle is empty or
