@@ -54,41 +54,20 @@ TEST(ModelReaderRaw, AnyCuttingOfReadsGivesThePayload) {
     }
 }
 
-TEST(ModelReaderRaw, SizeTimesCountIsTheUnitOfARead) {
-    const std::vector<uint8_t> payload = patternPayload(64);
-    ScopedModel model("units", payload);
-    ModelReader reader("units", ModelReader::RAW);
-    uint32_t words[4];
-    EXPECT_EQ(reader.read(words, 4, 4), 4u);
-    EXPECT_EQ(std::memcmp(words, payload.data(), 16), 0);
-    // Empty reads move nothing and return the count.
-    EXPECT_EQ(reader.read(words, 0, 9), 9u);
-    EXPECT_EQ(reader.read(words, 9, 0), 0u);
-    EXPECT_EQ(reader.read(nullptr, 0, 0), 0u);
-    uint8_t next = 0;
-    reader.read(&next, 1, 1);
-    EXPECT_EQ(next, payload[16]);
-}
-
-TEST(ModelReaderRaw, ReadersOverOneModelAreIndependent) {
+TEST(ModelReaderRaw, EmptyReadsMoveNothingAndReadersAreIndependent) {
     const std::vector<uint8_t> payload = patternPayload(300);
     ScopedModel model("shared", payload);
     ModelReader a("shared", ModelReader::RAW);
     ModelReader b("dir/shared::object", ModelReader::RAW);
-    std::vector<uint8_t> head(100);
-    a.read(head.data(), 1, 100);
+    uint32_t words[4];
+    EXPECT_EQ(a.read(words, 4, 4), 4u);
+    EXPECT_EQ(std::memcmp(words, payload.data(), 16), 0);
+    EXPECT_EQ(a.read(words, 0, 9), 9u);
+    EXPECT_EQ(a.read(nullptr, 9, 0), 0u);
     EXPECT_EQ(readInChunks(b, {300}), payload);
-    std::vector<uint8_t> rest(200);
-    a.read(rest.data(), 1, 200);
-    EXPECT_TRUE(std::equal(rest.begin(), rest.end(), payload.begin() + 100));
-}
-
-TEST(ModelReaderRaw, SeedOnlyModelHasNoPayload) {
-    ScopedModel model("seedonly", {});
-    ModelReader reader("seedonly", ModelReader::RAW);
-    EXPECT_EQ(reader.rawSize(), 0u);
-    uint8_t byte = 0;
-    EXPECT_THROW(reader.read(&byte, 1, 1), qv_data_error);
+    uint8_t next = 0;
+    a.read(&next, 1, 1);
+    EXPECT_EQ(next, payload[16]);
 }
 
 TEST(ModelReaderBounds, ReadingPastTheEndRaisesAndConsumesNothing) {
@@ -98,53 +77,39 @@ TEST(ModelReaderBounds, ReadingPastTheEndRaisesAndConsumesNothing) {
     std::vector<uint8_t> out(16, 0xEE);
     reader.read(out.data(), 1, 4);
     expectMessage([&] { reader.read(out.data(), 1, 7); }, "Model data truncated");
-    expectMessage([&] { reader.read(out.data(), 4, 2); }, "Model data truncated");
+    expectMessage([&] { reader.read(out.data(), 0x10000u, 0x10000u); }, "Model data truncated");  // wraps to 0
     EXPECT_EQ(out[4], 0xEE) << "nothing written by a refused read";
-    // The cursor and the unscrambling counter stayed: the rest reads right.
+    // Cursor and unscrambling counter stayed where they were.
     reader.read(out.data() + 4, 2, 3);
     EXPECT_TRUE(std::equal(payload.begin(), payload.end(), out.begin()));
     EXPECT_THROW(reader.read(out.data(), 1, 1), qv_data_error);
 }
 
-TEST(ModelReaderBounds, WrappingProductsAreRefused) {
-    ScopedModel model("wrap", patternPayload(8));
-    ModelReader reader("wrap", ModelReader::RAW);
-    uint8_t out[8];
-    // 0x10000 * 0x10000 wraps to 0 in 32 bits.
-    EXPECT_THROW(reader.read(out, 0x10000u, 0x10000u), qv_data_error);
-    EXPECT_THROW(reader.read(out, 0xFFFFFFFFu, 2), qv_data_error);
-    EXPECT_EQ(reader.read(out, 1, 8), 8u);
-}
-
-TEST(ModelReaderBounds, RangesTooShortForTheSeedAreRefused) {
-    for (std::size_t size : {0u, 1u, 3u}) {
+TEST(ModelReaderBounds, SeedOnlyModelsAreEmptyAndShorterOnesRefused) {
+    ScopedModel seedOnly("seedonly", {});
+    ModelReader reader("seedonly", ModelReader::RAW);
+    EXPECT_EQ(reader.rawSize(), 0u);
+    for (std::size_t size : {0u, 3u}) {
         ScopedModel model = ScopedModel::raw("tiny", std::vector<uint8_t>(size, 1));
-        expectMessage([] { ModelReader reader("tiny", ModelReader::RAW); }, "Model data truncated");
+        expectMessage([] { ModelReader r("tiny", ModelReader::RAW); }, "Model data truncated");
     }
 }
 
-TEST(ModelReaderPaths, ModelPathAndObjectName) {
+TEST(ModelReaderPaths, ModelPathObjectNameAndFailures) {
     typedef std::pair<std::string, std::string> P;
-    EXPECT_EQ(ModelReader::parseObjectPathAndName("m"), P("m", ""));
     EXPECT_EQ(ModelReader::parseObjectPathAndName("m::"), P("m", ""));
     EXPECT_EQ(ModelReader::parseObjectPathAndName("::n"), P("", "n"));
     EXPECT_EQ(ModelReader::parseObjectPathAndName("a/m::b::c"), P("a/m", "b::c"));
     EXPECT_EQ(ModelReader::parseObjectPathAndName("m:x"), P("m:x", ""));
-
     ScopedModel model("pathed", {5});
-    ModelReader reader("pathed::", ModelReader::RAW);
-    EXPECT_EQ(reader.objectName(), "");
-    EXPECT_EQ(reader.rawSize(), 1u);
-}
+    EXPECT_EQ(ModelReader("pathed::", ModelReader::RAW).rawSize(), 1u);
 
-TEST(ModelReaderPaths, BadPathsAndUnknownModels) {
     for (const char* path : {"", "::", "::name"})
-        expectMessage([&] { ModelReader reader(path, ModelReader::RAW); }, "Invalid model path");
+        expectMessage([&] { ModelReader r(path, ModelReader::RAW); }, "Invalid model path");
     const std::string notFound = descrambleText(scrambled::kModelNotFound);
-    EXPECT_FALSE(notFound.empty());
-    for (const char* path : {"nosuchmodel", "mdcb.bin", "MDCB", "mdcb/"}) {
+    for (const char* path : {"nosuchmodel", "mdcb.bin", "MDCB"}) {
         EXPECT_THROW(ModelReader(path, ModelReader::RAW), qv_data_error) << path;
-        expectMessage([&] { ModelReader reader(path, ModelReader::RAW); }, notFound);
+        expectMessage([&] { ModelReader r(path, ModelReader::RAW); }, notFound);
     }
 }
 
@@ -153,7 +118,6 @@ TEST(ModelReaderModes, OnlyRawModeReads) {
     EXPECT_THROW(ModelReader("moded", ModelReader::IVB), qv_unsupported_error);
     // Other modes are kept as given but cannot read.
     ModelReader odd("moded", 5);
-    EXPECT_EQ(odd.mode(), 5);
     uint8_t out[4];
     expectMessage([&] { odd.read(out, 1, 1); }, "The reader does not support raw mode loading");
     expectMessage([&] { odd.rawSize(); }, "The reader does not support raw mode loading");

@@ -4,78 +4,65 @@
 #include "core/ModelRegistry.h"
 #include "support/ScopedModel.h"
 
+namespace {
+bool found(const std::string& name, const uint8_t** begin = nullptr) {
+    const uint8_t* b = nullptr;
+    const uint8_t* e = nullptr;
+    const bool ok = ModelRegistry::instance().findModel(name, b, e);
+    if (begin) *begin = b;
+    return ok;
+}
+}  // namespace
+
 TEST(ModelRegistryPaths, ReducesToTheLastComponentWithUnderscores) {
     EXPECT_EQ(ModelRegistry::translateModelPath("models/mdcb"), "mdcb");
     EXPECT_EQ(ModelRegistry::translateModelPath("mdcb.bin"), "mdcb_bin");
     EXPECT_EQ(ModelRegistry::translateModelPath("a.b/c.d"), "c_d");
-    EXPECT_EQ(ModelRegistry::translateModelPath(""), "");
     EXPECT_EQ(ModelRegistry::translateModelPath("C:\\m\\x-y"), "y");
     EXPECT_EQ(ModelRegistry::translateModelPath("trailing/"), "");
-    EXPECT_EQ(ModelRegistry::dot2Underscore('.'), '_');
-    EXPECT_EQ(ModelRegistry::dot2Underscore('/'), '/');
+    EXPECT_EQ(ModelRegistry::translateModelPath(""), "");
 }
 
-TEST(ModelRegistryLookup, FindsTheThreeBuiltInRanges) {
-    const ModelRegistry& registry = ModelRegistry::instance();
-    for (const char* name : {"mdcb", "/x/y/mdnb", "mdpb", "models/mdcb"}) {
+TEST(ModelRegistryLookup, FindsTheBuiltInsAndLeavesOutParametersAloneOnAMiss) {
+    for (const char* name : {"mdcb", "/x/y/mdnb", "mdpb"}) {
         const uint8_t* b = nullptr;
         const uint8_t* e = nullptr;
-        ASSERT_TRUE(registry.findModel(name, b, e)) << name;
-        ASSERT_NE(b, nullptr);
+        ASSERT_TRUE(ModelRegistry::instance().findModel(name, b, e)) << name;
         EXPECT_GE(e - b, 4) << "a raw model holds at least its seed: " << name;
     }
-}
-
-TEST(ModelRegistryLookup, MissLeavesOutParametersAlone) {
     const uint8_t marker[2] = {1, 2};
-    for (const char* name : {"MDCB", "mdcb.bin", "", "mdcb/", "mdxx"}) {
+    for (const char* name : {"MDCB", "mdcb.bin", "", "mdcb/"}) {
         const uint8_t* b = marker;
         const uint8_t* e = marker + 1;
         EXPECT_FALSE(ModelRegistry::instance().findModel(name, b, e)) << name;
-        EXPECT_EQ(b, marker);
-        EXPECT_EQ(e, marker + 1);
+        EXPECT_TRUE(b == marker && e == marker + 1);
     }
 }
 
-TEST(ModelRegistryExtension, ServesAndWithdrawsTestModels) {
-    const uint8_t* b = nullptr;
-    const uint8_t* e = nullptr;
-    {
-        ScopedModel model("unit_test_model", {1, 2, 3});
-        ASSERT_TRUE(ModelRegistry::instance().findModel("some/dir/unit_test_model", b, e));
-        EXPECT_EQ(b, model.packed().data());
-        EXPECT_EQ(e - b, 7);
-    }
-    EXPECT_FALSE(ModelRegistry::instance().findModel("unit_test_model", b, e));
-}
-
-TEST(ModelRegistryExtension, OverridingABuiltInIsUndoneOnUnregister) {
+TEST(ModelRegistryExtension, TestModelsComeAndGoAndBuiltInsComeBack) {
     const uint8_t* original = nullptr;
-    const uint8_t* originalEnd = nullptr;
-    ASSERT_TRUE(ModelRegistry::instance().findModel("mdpb", original, originalEnd));
+    ASSERT_TRUE(found("mdpb", &original));
     {
-        ScopedModel model("mdpb", {9, 9});
+        ScopedModel extra("unit_test_model", {1, 2, 3});
+        ScopedModel replacement("mdpb", {9, 9});
         const uint8_t* b = nullptr;
-        const uint8_t* e = nullptr;
-        ASSERT_TRUE(ModelRegistry::instance().findModel("mdpb", b, e));
-        EXPECT_EQ(b, model.packed().data());
+        EXPECT_TRUE(found("some/dir/unit_test_model", &b));
+        EXPECT_EQ(b, extra.packed().data());
+        EXPECT_TRUE(found("mdpb", &b));
+        EXPECT_EQ(b, replacement.packed().data());
     }
+    EXPECT_FALSE(found("unit_test_model"));
     const uint8_t* b = nullptr;
-    const uint8_t* e = nullptr;
-    ASSERT_TRUE(ModelRegistry::instance().findModel("mdpb", b, e));
+    EXPECT_TRUE(found("mdpb", &b));
     EXPECT_EQ(b, original);
-    EXPECT_EQ(e, originalEnd);
 }
 
 TEST(ModelRegistryExtension, RejectsNamesAndRangesItCouldNotServe) {
     ModelRegistry& registry = ModelRegistry::instance();
     const uint8_t bytes[4] = {};
-    for (const char* name : {"", "a.b", "dir/name", "x y", "a::b"})
+    for (const char* name : {"", "a.b", "dir/name", "a::b"})
         EXPECT_THROW(registry.registerModel(name, bytes, bytes + 4), qv_invalid_argument) << name;
     EXPECT_THROW(registry.registerModel("ok", nullptr, bytes), qv_invalid_argument);
     EXPECT_THROW(registry.registerModel("ok", bytes + 4, bytes), qv_invalid_argument);
-    const uint8_t* b = nullptr;
-    const uint8_t* e = nullptr;
-    EXPECT_FALSE(registry.findModel("ok", b, e));
-    EXPECT_NO_THROW(registry.unregisterModel("never_registered"));
+    EXPECT_FALSE(found("ok"));
 }

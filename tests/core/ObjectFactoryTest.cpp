@@ -8,18 +8,15 @@ namespace {
 
 struct Widget {
     std::string param;
-    static std::string lastParam;
     static int calls;
     static Widget* create(const std::string& text) {
         ++calls;
-        lastParam = text;
         if (text == "{\"fail\":1}") return nullptr;
         Widget* w = new Widget;
         w->param = text;
         return w;
     }
 };
-std::string Widget::lastParam;
 int Widget::calls = 0;
 
 class WidgetFactory : public ObjectFactory<Widget> {
@@ -33,38 +30,30 @@ private:
     WidgetFactory() { creators["PLAIN_WIDGET"] = &Widget::create; }
 };
 
+std::unique_ptr<Widget> make(const std::string& description) {
+    return std::unique_ptr<Widget>(WidgetFactory::instance().createInstance(description));
+}
+
 }  // namespace
 
-TEST(ObjectFactory, CreatesByNameWithTheRawParamText) {
-    std::unique_ptr<Widget> w(
-        WidgetFactory::instance().createInstance("{  \"name\" : \"PLAIN_WIDGET\",   \"param\" : { \"k\" : [1, 2] }}"));
+TEST(ObjectFactory, HandsTheCreatorTheRawParamTextOrAnEmptyOne) {
+    auto w = make("{  \"name\" : \"PLAIN_WIDGET\",   \"param\" : { \"k\" : [1, 2] }}");
     ASSERT_TRUE(w);
     EXPECT_EQ(w->param, "{ \"k\" : [1, 2] }");
-}
-
-TEST(ObjectFactory, MissingParamGivesTheCreatorAnEmptyText) {
-    Widget::lastParam = "unset";
-    std::unique_ptr<Widget> w(WidgetFactory::instance().createInstance("{\"name\":\"PLAIN_WIDGET\"}"));
+    w = make("{\"name\":\"PLAIN_WIDGET\"}");
     ASSERT_TRUE(w);
-    EXPECT_EQ(Widget::lastParam, "");
+    EXPECT_EQ(w->param, "");
+    EXPECT_FALSE(make("{\"name\":\"PLAIN_WIDGET\",\"param\":{\"fail\":1}}"));
 }
 
-TEST(ObjectFactory, UnknownOrMissingNameGivesNullWithoutCallingACreator) {
+TEST(ObjectFactory, UnknownOrMissingNameIsNullWithoutCallingACreator) {
     const int before = Widget::calls;
-    EXPECT_EQ(WidgetFactory::instance().createInstance("{\"name\":\"OTHER\",\"param\":{}}"), nullptr);
-    EXPECT_EQ(WidgetFactory::instance().createInstance("{\"name\":\"plain_widget\"}"), nullptr);
-    EXPECT_EQ(WidgetFactory::instance().createInstance("{\"param\":{}}"), nullptr);
-    EXPECT_EQ(WidgetFactory::instance().createInstance("{}"), nullptr);
+    for (const char* text : {"{\"name\":\"OTHER\",\"param\":{}}", "{\"name\":\"plain_widget\"}", "{\"param\":{}}", "{}"})
+        EXPECT_FALSE(make(text)) << text;
     EXPECT_EQ(Widget::calls, before);
 }
 
-TEST(ObjectFactory, CreatorFailureIsNull) {
-    EXPECT_EQ(WidgetFactory::instance().createInstance("{\"name\":\"PLAIN_WIDGET\",\"param\":{\"fail\":1}}"), nullptr);
-}
-
 TEST(ObjectFactory, MalformedDescriptionRaisesTheReadersError) {
-    EXPECT_THROW(WidgetFactory::instance().createInstance(""), JsonError);
-    EXPECT_THROW(WidgetFactory::instance().createInstance(" {\"name\":\"PLAIN_WIDGET\"}"), JsonError);
-    // A bare name is not a string.
-    EXPECT_THROW(WidgetFactory::instance().createInstance("{\"name\":PLAIN_WIDGET}"), JsonError);
+    for (const char* text : {"", " {\"name\":\"PLAIN_WIDGET\"}", "{\"name\":PLAIN_WIDGET}"})
+        EXPECT_THROW(make(text), JsonError) << text;
 }
