@@ -29,6 +29,11 @@ void requireEngine(const void* engine) {
 
 }  // namespace
 
+void PipelineStages::init(const std::string& faceRects, const std::string& faceParts) {
+    parseJsonObject(faceRects);
+    parseJsonObject(faceParts);
+}
+
 void setPipelineStagesOverride(PipelineStages* stages) { g_stagesOverride = stages; }
 PipelineStages* pipelineStagesOverride() { return g_stagesOverride; }
 
@@ -40,6 +45,11 @@ void FaceDetectionPipeline::init(const FaceModelPaths& paths) {
         std::map<std::string, std::string> detection = parseJsonObject(paths.detection());
         std::string faceRects = valueOrEmpty(detection, "faceRects");
         std::string faceParts = valueOrEmpty(detection, "faceParts");
+        if (g_stagesOverride != nullptr) {
+            g_stagesOverride->init(faceRects, faceParts);
+            staged_ = true;
+            return;
+        }
         detector_ = new FaceDetector();
         detector_->init(faceRects);
         locator_ = new FacePartLocator();
@@ -51,6 +61,7 @@ void FaceDetectionPipeline::init(const FaceModelPaths& paths) {
 }
 
 void FaceDetectionPipeline::release() {
+    staged_ = false;
     delete detector_;
     detector_ = nullptr;
     delete locator_;

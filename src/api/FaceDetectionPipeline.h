@@ -36,9 +36,10 @@ public:
     // The locator is not run on a frame without faces.
     std::vector<FaceRecord> detect(const DetectionRequest& request);
 
-    bool ready() const { return detector_ != nullptr && locator_ != nullptr; }
+    bool ready() const { return staged_ || (detector_ != nullptr && locator_ != nullptr); }
 
 private:
+    bool staged_ = false;  // initialised on an installed PipelineStages
     FaceDetector* detector_ = nullptr;
     FacePartLocator* locator_ = nullptr;
 };

@@ -1,19 +1,23 @@
 #ifndef QUORIN_API_PIPELINESTAGES_H
 #define QUORIN_API_PIPELINESTAGES_H
 
+#include <string>
 #include <vector>
 
 #include "core/FaceData.h"
 #include "detector/FaceTrackingMode.h"
 
 // A stand-in for the detector and the part locator of every pipeline. While
-// one is installed, FaceDetectionPipeline sends the setters, detect and
-// locateParts to it instead of its own engines, so that the road from a list
-// of faces to the host's result blocks can be driven with chosen faces.
-// Internal to the library: never exported.
+// one is installed, FaceDetectionPipeline builds no engines and sends init,
+// the setters, detect and locateParts to it instead, so that the road from a
+// list of faces to the host's result blocks can be driven with chosen faces,
+// whatever models the library carries. Internal: never exported.
 class PipelineStages {
 public:
     virtual ~PipelineStages() = default;
+    // Receives the two configuration texts; by default requires each to be a
+    // JSON object, as the engines do.
+    virtual void init(const std::string& faceRects, const std::string& faceParts);
     virtual void setTrackingMode(QVFaceTrackingMode) {}
     virtual void setSearchStep(float, float) {}
     virtual void setFaceSizeRange(int, int) {}
