@@ -60,23 +60,43 @@ inline CascadeModelFeature squareEdge(int side)
     return CascadeWriter::haar({inner, outer});
 }
 
+// Darkness test of one side: the mean of a 3 x 3 corner, which the square
+// never reaches, minus the mean of the outer strip of that side. Near 0 only
+// when the strip is as dark as the corner, so the square must not reach into it.
+inline CascadeModelFeature squareOuterDark(int side)
+{
+    CascadeModelRect corner, outer;
+    switch (side) {
+    case 0: corner = {1.0f / 9, 0, 0, 3, 3}; outer = {-1.0f / 24, 0, 8, 3, 16}; break;
+    case 1: corner = {1.0f / 9, 21, 0, 24, 3}; outer = {-1.0f / 24, 21, 8, 24, 16}; break;
+    case 2: corner = {1.0f / 9, 0, 0, 3, 3}; outer = {-1.0f / 24, 8, 0, 16, 3}; break;
+    default: corner = {1.0f / 9, 0, 21, 3, 24}; outer = {-1.0f / 24, 8, 21, 16, 24}; break;
+    }
+    return CascadeWriter::haar({corner, outer});
+}
+
 // A stage that every window passes, adding nothing.
 inline CascadeModelStage passStage()
 {
     return CascadeWriter::stump(CascadeWriter::deviation(), 0.0f, 0.0f, 0.0f, -1e30f);
 }
 
-// `fillers` pass-all stages, then the four edge tests (left first), each
-// rejecting a window whose edge contrast is below 1 deviation. An accepted
-// window scores 0 plus `bonus` from a last stage.
+// `fillers` pass-all stages, then the four edge tests (left, right, top,
+// bottom), each rejecting a window whose edge contrast is below 1.5 deviations
+// (an exact fit gives 2),
+// then the four darkness tests, which pin the square to one position and
+// scale. An accepted window scores 0 plus `bonus` from a last stage.
 inline CascadeModel squareCascade(int fillers = 0, float bonus = 0.0f)
 {
     CascadeModel model;
     for (int i = 0; i < fillers; ++i)
         model.common.push_back(passStage());
     for (int side = 0; side < 4; ++side)
-        model.common.push_back(CascadeWriter::stump(squareEdge(side), 1.0f, 0.0f, -1.0f, -0.5f));
+        model.common.push_back(CascadeWriter::stump(squareEdge(side), 1.5f, 0.0f, -1.0f, -0.5f));
+    for (int side = 0; side < 4; ++side)
+        model.common.push_back(CascadeWriter::stump(squareOuterDark(side), -0.3f, 0.0f, -1.0f, -0.5f));
     model.common.push_back(CascadeWriter::stump(CascadeWriter::deviation(), -1.0f, bonus, bonus, -1e30f));
+    CascadeWriter::completeBranches(model);
     return model;
 }
 

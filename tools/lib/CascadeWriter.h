@@ -16,8 +16,12 @@
 //   int32 scoreCount (0..15), int32 remapFlag
 //   remapFlag != 0: int32 remap[scoreCount], each 0..scoreCount-1
 //   per score: float32 binScores[8], float32 rejectThreshold
+// The number of branches is not stored: the reader takes it from the scoreCount
+// of the last common stage, so even a one-score cascade carries one (empty)
+// branch; completeBranches pads a model that doesn't say so.
 // The writer checks nothing: tests use it to make malformed models too.
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <cstdio>
@@ -85,6 +89,14 @@ public:
         s.binScores.push_back({{above, above, above, above, below, below, below, below}});
         s.rejectThresholds.push_back(reject);
         return s;
+    }
+
+    // Pads `branches` with empty ones up to the scoreCount of the last common stage.
+    static void completeBranches(CascadeModel& model)
+    {
+        const size_t wanted = model.common.empty() ? 0 : static_cast<size_t>(std::max(model.common.back().scoreCount, 0));
+        if (model.branches.size() < wanted)
+            model.branches.resize(wanted);
     }
 
     // Serialises the model to its plain payload.
