@@ -7,7 +7,6 @@
 #include "core/FaceModelPaths.h"
 #include "core/FaceModelPathsHandle.h"
 #include "core/Json.h"
-#include "core/ModelRegistry.h"
 #include "core/ScrambledTexts.h"
 #include "support/SourceTree.h"
 
@@ -71,12 +70,6 @@ TEST(DefaultConfiguration, CarriesWhatTheDetectorAndLocatorRead) {
     EXPECT_EQ(stringItem(postfilter, "name"), "ILABS_POSTFILTER");
     const auto postfilterParam = parseJsonObject(postfilter.at("param"));
 
-    // Every model the configuration names is served by the registry.
-    const uint8_t* b = nullptr;
-    const uint8_t* e = nullptr;
-    for (const std::string& model : {stringItem(detector, "model"), stringItem(postfilterParam, "model"),
-                                     stringItem(faceParts, "neuralNetModelPath")})
-        EXPECT_TRUE(ModelRegistry::instance().findModel(model, b, e)) << model;
     EXPECT_EQ(stringItem(detector, "model"), "mdcb");
     EXPECT_EQ(stringItem(postfilterParam, "model"), "mdpb");
     EXPECT_EQ(stringItem(faceParts, "neuralNetModelPath"), "mdnb");
@@ -92,21 +85,12 @@ TEST(FaceModelPathsText, ReadsAllFourFieldsAndWritesNonEmptyOnesCompactly) {
     EXPECT_EQ(paths.attribute(), "");  // overwritten although absent
     EXPECT_EQ(paths.toJson(), "{\"detection\":{\"d\" : [1, 2]},\"recognition\":{\"r\": 1}}");
 
-    paths.fromJson("{}");
-    EXPECT_EQ(paths.toJson(), "{}");
-    paths.setRepresentation("[]");
-    paths.setDetection("{}");
-    EXPECT_EQ(paths.toJson(), "{\"detection\":{},\"representation\":[]}");
-    paths.release();
-    EXPECT_EQ(paths.toJson(), "{}");
-}
-
-TEST(FaceModelPathsText, MalformedTextLeavesFieldsAlone) {
-    FaceModelPaths paths;
-    paths.setDetection("{\"keep\":1}");
+    // A malformed text leaves the fields alone.
     EXPECT_THROW(paths.fromJson(""), JsonError);
     EXPECT_THROW(paths.fromJson("{\"detection\":{}"), JsonError);
-    EXPECT_EQ(paths.detection(), "{\"keep\":1}");
+    EXPECT_EQ(paths.detection(), "{\"d\" : [1, 2]}");
+    paths.fromJson("{}");
+    EXPECT_EQ(paths.toJson(), "{}");
 }
 
 TEST(FaceModelPathsFile, TrimsLineFeedsAndBlanksButNotCarriageReturn) {
