@@ -3,11 +3,13 @@
 #include <cstring>
 #include <functional>
 #include <random>
+#include <sstream>
 #include <string>
 #include <vector>
 
 #include "NetWriter.h"
 #include "support/ScopedModel.h"
+#include "support/SourceTree.h"
 #include "core/Errors.h"
 #include "faceparts/NeuralClassifier.h"
 
@@ -308,4 +310,58 @@ TEST(ClassifierClassify, ANetThatCannotRunReportsAnOutputError) {
     float in[4] = {0, 0, 0, 0};
     uint32_t best = 0;
     EXPECT_EQ(messageOf([&] { c.Classify(in, 4, &best, nullptr, 0); }), "Neural Net output error");
+}
+
+// ---- the Python writer -----------------------------------------------------------------
+
+TEST(ClassifierPythonWriter, ReadsTheToolsContainerAndAgreesWithItsReferenceRun) {
+    const std::string dir = sourcetree::scratchDir("netwriter_demo");
+    const std::string command = sourcetree::python() + " '" + sourcetree::path("tools/netwriter.py") +
+                                "' demo --seed 3 --out-dir '" + dir + "'";
+    if (std::system(command.c_str()) != 0) GTEST_SKIP() << "python writer unavailable";
+    const std::vector<uint8_t> image = sourcetree::readBytes(dir + "/demo_net.bin");
+    NeuralClassifier c;
+    ASSERT_NO_THROW(c.LoadClassifierData(image.data(), image.size()));
+    ASSERT_NE(c.net(), nullptr);
+    std::istringstream cases(sourcetree::readText(dir + "/demo_cases.txt"));
+    std::string line;
+    int checked = 0;
+    while (std::getline(cases, line)) {
+        std::istringstream in(line);
+        std::vector<int32_t> inputs, expected;
+        std::string token;
+        int part = 0;
+        uint32_t expectedBest = 0;
+        while (in >> token) {
+            if (token == "|") ++part;
+            else if (part == 0) inputs.push_back(int32_t(std::stoll(token)));
+            else if (part == 1) expected.push_back(int32_t(std::stoll(token)));
+            else expectedBest = uint32_t(std::stoul(token));
+        }
+        uint32_t best = 99;
+        const int32_t* out = c.net()->Run(inputs.data(), &best);
+        ASSERT_NE(out, nullptr);
+        EXPECT_EQ(std::vector<int32_t>(out, out + expected.size()), expected) << line;
+        EXPECT_EQ(best, expectedBest) << line;
+        ++checked;
+    }
+    EXPECT_EQ(checked, 25);
+}
+
+TEST(ClassifierPythonWriter, MeanShapeModelPlacesTheSameShapeInEveryBox) {
+    const std::vector<uint8_t> image = sourcetree::readBytes(sourcetree::path("models/mdnb.bin"));
+    NeuralClassifier c;
+    ASSERT_NO_THROW(c.LoadClassifierData(image.data(), image.size()));
+    uint32_t n = 0;
+    ASSERT_TRUE(c.inputCount(&n));
+    std::vector<float> dark(n, 0.0f), bright(n, 5000.0f);
+    float a[10], b[10];
+    uint32_t best = 0;
+    c.Classify(dark.data(), n, &best, a, 10);
+    c.Classify(bright.data(), n, &best, b, 10);
+    for (int i = 0; i < 10; ++i) {
+        EXPECT_EQ(a[i], b[i]);
+        EXPECT_GT(a[i], 0.0f);
+        EXPECT_LT(a[i] * 10000.0f / 65535.0f, 1.0f);  // inside the box
+    }
 }
