@@ -13,6 +13,8 @@ PKGS=(
 )
 missing=()
 for p in "${PKGS[@]}"; do
+  # A nodejs that bundles npm (as the NodeSource build does) conflicts with Debian's npm.
+  [ "$p" = npm ] && command -v npm >/dev/null && continue
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")
 done
 if ((${#missing[@]})); then
