@@ -67,6 +67,10 @@ if [ ${#photos[@]} -eq 1 ]; then
 else
   "$DETECT" "${photos[@]}" > "$OUT/faces.json" || status=$?
 fi
+if [ "$status" -ne 0 ]; then
+  say "quorin-detect failed (exit $status); see the messages above and $OUT/faces.json"
+  exit "$status"
+fi
 faces=$(grep -o '"rect"' "$OUT/faces.json" | wc -l || true)
 if [ ${#photos[@]} -eq 1 ]; then
   say "found $faces face(s); wrote $OUT/faces.json and $OUT/faces-annotated.png"
