@@ -72,6 +72,36 @@ TEST(QuorinSession, ModeChangeWithoutSessionIsRefusedButTheCurrentModeIsQuiet) {
     EXPECT_EQ(sessionSnapshot().detectionMode, mode);
 }
 
+// Stand-ins whose construction fails, as engines with a broken model would.
+class FailingInitStages : public qtest::ScriptedStages {
+public:
+    void init(const std::string&, const std::string&) override { throw std::runtime_error("no model"); }
+};
+
+TEST(QuorinSession, FailedInitLeavesAnUnusableSessionThatFailsCleanly) {
+    quorin_release();
+    FailingInitStages stages;
+    qtest::ScopedStages guard(stages);
+    try {
+        quorin_init();
+        FAIL() << "init should fail";
+    } catch (const ApiError& e) {
+        EXPECT_STREQ(e.what(), "QVFace Detection API initialization error");
+    }
+    SessionSnapshot s = sessionSnapshot();
+    EXPECT_TRUE(s.open);
+    EXPECT_FALSE(s.buffersAllocated);
+    Frame frame = patternFrame(64, 48);
+    Blocks out = blocks(1);
+    EXPECT_THROW(quorin_detect(frame.data(), 64, 48, out.data(), 1, 0), ApiError);
+    EXPECT_THROW(quorin_detect360Tracking(frame.data(), 64, 48, out.data(), 1), ApiError);
+    EXPECT_THROW(quorin_detect360High(frame.data(), 64, 48, out.data(), 1), ApiError);
+    EXPECT_TRUE(stages.frames.empty());
+    EXPECT_EQ(out, blocks(1));
+    quorin_release();
+    EXPECT_FALSE(sessionSnapshot().open);
+}
+
 TEST_F(QuorinApiTest, NewSessionStartsInHighModeWithUnknownOrientation) {
     SessionSnapshot s = sessionSnapshot();
     EXPECT_TRUE(s.open);
