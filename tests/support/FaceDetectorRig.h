@@ -1,0 +1,74 @@
+#ifndef QUORIN_TESTS_FACEDETECTORRIG_H
+#define QUORIN_TESTS_FACEDETECTORRIG_H
+
+// A FaceDetector on the square cascade (tests/support/SquareCascade.h) with an
+// ILABS post filter that judges by the cascade score alone, served from
+// in-memory models for the lifetime of the rig.
+
+#include <string>
+#include <vector>
+
+#include "PostFilterModels.h"
+#include "ScopedModel.h"
+#include "SquareCascade.h"
+
+// The square cascade ends in one score, so the model carries one branch; an
+// empty one is never evaluated.
+inline CascadeModel singleBranch(CascadeModel model)
+{
+    if (model.branches.empty()) model.branches.push_back({});
+    return model;
+}
+
+// The square cascade whose score tells contrast apart: a square of full
+// contrast (kDark on kBright) scores 7, which the post filter passes without a
+// look; a square of half that contrast scores 1.
+inline CascadeModel contrastScoredCascade()
+{
+    CascadeModel model = squareCascade(10, 0.0f);
+    model.common.back() = CascadeWriter::stump(CascadeWriter::deviation(), 0.015f, 1.0f, 7.0f, -1e30f);
+    return singleBranch(model);
+}
+
+constexpr unsigned char kHalfBright = 120;
+
+// Accepts a window whose left and top edges meet a bright block's corner,
+// whatever the block's size: the same corner is a hit at many window sizes.
+inline CascadeModel cornerCascade()
+{
+    CascadeModel model;
+    for (int i = 0; i < 10; ++i) model.common.push_back(passStage());
+    model.common.push_back(CascadeWriter::stump(squareEdge(0), 1.0f, 0.0f, -1.0f, -0.5f));
+    model.common.push_back(CascadeWriter::stump(squareEdge(2), 1.0f, 0.0f, -1.0f, -0.5f));
+    model.common.push_back(CascadeWriter::stump(CascadeWriter::deviation(), -1.0f, 1.0f, 1.0f, -1e30f));
+    return singleBranch(model);
+}
+
+struct FaceDetectorModels {
+    ScopedModel cascade;
+    ScopedModel postFilter;
+
+    // Accepted squares score `bonus`; the post filter passes a hit whose score
+    // is above `passAbove` (hits of 6 or more pass without a look).
+    explicit FaceDetectorModels(float bonus = 1.0f, float passAbove = 0.0f)
+        : cascade("fdtest_cascade", CascadeWriter::toBytes(singleBranch(squareCascade(10, bonus)))),
+          postFilter("fdtest_ilabs", pftest::ilabsThresholdModel(0, {passAbove}))
+    {
+    }
+
+    // The contrast-scored cascade with the same post filter.
+    struct ContrastScored {};
+    FaceDetectorModels(ContrastScored, float passAbove)
+        : cascade("fdtest_cascade", CascadeWriter::toBytes(contrastScoredCascade())),
+          postFilter("fdtest_ilabs", pftest::ilabsThresholdModel(0, {passAbove}))
+    {
+    }
+
+    static std::string config(int imageMaxSize = 1024, int faceMinSize = 24, int faceMaxSize = 0)
+    {
+        return "{\"detector\":" + detectorConfig("fdtest_cascade", imageMaxSize, faceMinSize, faceMaxSize) +
+               ",\"postfilter\":{\"name\":\"ILABS_POSTFILTER\",\"param\":{\"model\":\"fdtest_ilabs\"}}}";
+    }
+};
+
+#endif
