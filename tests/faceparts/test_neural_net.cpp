@@ -52,7 +52,7 @@ void expectMatchesReference(const NetDescription& d, uint32_t seed, int trials =
 
 // ---- fixed-point functions ---------------------------------------------------
 
-TEST(FixedPointSigmoid, HitsItsAnchorsAndSaturatesAtNine) {
+TEST(FixedPointSigmoid, HitsItsAnchorsSaturatesAtNineAndIsOddAroundHalf) {
     EXPECT_EQ(Sigmoid16(0), 0x8000);
     EXPECT_EQ(Sigmoid16(0x90000), 0x10000);
     EXPECT_EQ(Sigmoid16(-0x90000), 0);
@@ -61,15 +61,12 @@ TEST(FixedPointSigmoid, HitsItsAnchorsAndSaturatesAtNine) {
     // Just below 9.0 the last interval leans on the 0xFFFF entry.
     EXPECT_GT(Sigmoid16(0x8FFFF), 0xFFF8);
     EXPECT_LE(Sigmoid16(0x8FFFF), 0xFFFF);
-}
-
-TEST(FixedPointSigmoid, IsOddAroundHalfAndMonotonic) {
     int32_t previous = -1;
     for (int32_t x = -0x98000; x <= 0x98000; x += 97) {
         const int32_t s = Sigmoid16(x);
-        ASSERT_GE(s, previous) << x;
+        ASSERT_GE(s, previous) << x;  // monotonic
         previous = s;
-        ASSERT_EQ(s + Sigmoid16(-x), 0x10000) << x;
+        ASSERT_EQ(s + Sigmoid16(-x), 0x10000) << x;  // odd around one half
     }
 }
 
@@ -137,22 +134,6 @@ TEST(FixedPointExp, IsOneForNonNegativeAndFollowsTheLogisticIdentity) {
 
 // ---- transfer functions ----------------------------------------------------------
 
-TEST(TransferFunctions, DivideTruncatingTowardZero) {
-    int32_t v[3] = {-7, 7, INT32_MIN};
-    NeuralNet::Linear(v, 3, 2);
-    EXPECT_EQ(v[0], -3);
-    EXPECT_EQ(v[1], 3);
-    EXPECT_EQ(v[2], INT32_MIN / 2);
-    int32_t w[3] = {-7, 7, INT32_MIN};
-    NeuralNet::Abs(w, 3, 2);
-    EXPECT_EQ(w[0], 3);
-    EXPECT_EQ(w[1], 3);
-    int32_t s[2] = {0, 65536 * 4};
-    NeuralNet::Sigmoid(s, 2, 4);
-    EXPECT_EQ(s[0], 0x8000);
-    EXPECT_EQ(s[1], Sigmoid16(65536));
-}
-
 TEST(SoftMax, EqualValuesShareEquallyAndTheFirstWins) {
     int32_t v[4] = {500, 500, 500, 500};
     uint32_t best = 9;
@@ -205,18 +186,6 @@ TEST(SoftMax, PairOfOneEachOverwritesTheSecondHalfsFirstEntry) {
 
 // ---- careful and fast loops ------------------------------------------------------
 
-TEST(CentralLoops, FastLoopAccumulatesAndWraps) {
-    const int16_t w[3] = {2, -3, 32767};
-    uint8_t bytes[6];
-    std::memcpy(bytes, w, sizeof bytes);
-    int32_t targets[3] = {10, 10, INT32_MAX};
-    const int32_t act = 65536;
-    NeuralNet::CentralLoop(targets, 3, bytes, &act);
-    EXPECT_EQ(targets[0], 10 + 131072);
-    EXPECT_EQ(targets[1], 10 - 196608);
-    EXPECT_EQ(targets[2], int32_t(uint32_t(INT32_MAX) + uint32_t(65536u * 32767u)));
-}
-
 TEST(CentralLoops, CarefulLoopOverwritesSaturatesAndWalksTheActivation) {
     const int16_t w[3] = {2, 32767, -32768};
     uint8_t bytes[6];
@@ -246,19 +215,6 @@ TEST(NetReader, LoadsEveryLayoutVersion) {
     }
 }
 
-TEST(NetReader, ReservedCountIsSixteenBitsUpToVersionEleven) {
-    // Same net, version 11 vs 12: the only layout difference before the
-    // divisors is the width of the reserved count, so 12 is not shorter.
-    const auto v11 = netwriter::writeBlob(smallNet(11));
-    const auto v12 = netwriter::writeBlob(smallNet(12));
-    EXPECT_GE(v12.size(), v11.size());
-    // A version-11 blob relabelled as 12 misreads the tables and is refused.
-    std::vector<uint8_t> relabelled = v11;
-    relabelled[0] = 12;
-    NeuralNet net;
-    EXPECT_THROW(net.loadBuffer(relabelled.data(), relabelled.size()), qv_operation_error);
-}
-
 TEST(NetReader, OldLayoutLoadsOnlyAsVersionTwoAndDoesNotRun) {
     NetDescription d = smallNet(2);
     const auto blob = netwriter::writeBlob(d);
@@ -271,6 +227,20 @@ TEST(NetReader, OldLayoutLoadsOnlyAsVersionTwoAndDoesNotRun) {
     d.version = 3;
     const auto other = netwriter::writeBlob(d);
     EXPECT_THROW(net.loadBuffer(other.data(), other.size()), qv_operation_error);
+}
+
+TEST(NetReader, ReadersWithoutASizeKeepTheValueAndRunChecks) {
+    const auto good = netwriter::writeBlob(smallNet());
+    NeuralNet net;
+    EXPECT_EQ(net.RestoreLocalConnectNet(good.data(), 0), 1);
+    EXPECT_EQ(net.RestoreLocalConnectNet(good.data(), 1), 0);  // expected marker
+    EXPECT_EQ(net.RestoreLocalConnectNetSafe(good.data(), uint32_t(good.size()), 0), 1);
+    uint32_t best = 0;
+    EXPECT_EQ(net.Run(&best), nullptr);  // tables alone don't size a work buffer
+    NetDescription d = smallNet();
+    d.spans[2][0][0].firstTarget = 8;
+    const auto wild = netwriter::writeBlob(d);
+    EXPECT_EQ(net.RestoreLocalConnectNet(wild.data(), 0), 0);
 }
 
 TEST(NetReader, RefusesWrongValueFields) {
