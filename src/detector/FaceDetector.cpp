@@ -2,13 +2,11 @@
 
 #include <algorithm>
 #include <map>
-#include <memory>
 
 #include "core/Errors.h"
 #include "core/Json.h"
 #include "detector/CascadeDetector.h"
 #include "detector/WindowMerger.h"
-#include "image/Image.h"
 #include "image/IntegralImage.h"
 #include "postfilter/PostFilter.h"
 #include "postfilter/PostFilterFactory.h"
@@ -137,9 +135,9 @@ void FaceDetector::detect(const unsigned char* gray, int width, int height, std:
     mergedHits.clear();
     finalHits.clear();
 
-    IMAGE frame(width, height, width, const_cast<unsigned char*>(gray));
+    // The host's rows are adjacent: the stride is the width.
     IN_IMAGE image;
-    image.Init(&frame);
+    if (!image.Init(width, height, width, gray)) throw qv_operation_error("Frame could not be prepared for the search");
 
     if (tracker != nullptr) {
         std::vector<DetectionWindow> previous, predicted;
