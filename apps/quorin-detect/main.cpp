@@ -4,6 +4,7 @@
 // image (--annotate) or onto the frames it passes on (--annotate-raw). Run it
 // with --help for the options and the output format.
 
+#include <cerrno>
 #include <chrono>
 #include <cstdio>
 #include <cstring>
@@ -115,7 +116,7 @@ int runImages(const Options& o, JsonSink& json) {
 
 class Progress {
  public:
-  Progress() : enabled_(isatty(STDERR_FILENO) == 1), start_(Clock::now()), last_(start_) {}
+  Progress() : enabled_(isatty(STDERR_FILENO) == 1), last_(Clock::now()) {}
   void frame(long frames, std::size_t faces, double engineMs) {
     if (!enabled_) return;
     auto now = Clock::now();
@@ -137,7 +138,7 @@ class Progress {
     std::fflush(stderr);
   }
   bool enabled_;
-  Clock::time_point start_, last_;
+  Clock::time_point last_;
 };
 
 int runRaw(const Options& o, JsonSink& json) {
