@@ -126,8 +126,13 @@ void ILabsClassifier::setCategories(std::vector<std::unique_ptr<CategoryModel>> 
 
 bool ILabsClassifier::classify(int category, const float* feature, int length) const
 {
+    return categoryScore(category, feature, length) > 0.0f;
+}
+
+float ILabsClassifier::categoryScore(int category, const float* feature, int length) const
+{
     if (category < 0 || category >= categoryCount())
         throw qv_invalid_argument(categories.empty() ? "PostFilter has no model loaded"
                                                      : "PostFilter category out of range");
-    return categories[category]->getScore(feature, length) > 0.0f;
+    return categories[category]->getScore(feature, length);
 }

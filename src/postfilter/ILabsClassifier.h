@@ -66,6 +66,8 @@ public:
     // True when the category's score is strictly above 0. A category outside
     // the loaded ones (or no model at all) raises qv_invalid_argument.
     bool classify(int category, const float* feature, int length) const;
+    // The category's score itself, with the same checks as classify.
+    float categoryScore(int category, const float* feature, int length) const;
 
 private:
     std::vector<CategoryModel*> categories;

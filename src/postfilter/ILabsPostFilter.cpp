@@ -52,6 +52,30 @@ std::string ILabsPostFilter::name() const
     return "ILABS_POSTFILTER";
 }
 
+void ILabsPostFilter::extract(IN_IMAGE const& image, ScoredWindow const& hit, IMAGE& patch, float* pixels,
+                              float* out) const
+{
+    const int size = SCALED_FACE_SIZE;
+    image.CropScaleToImage(&patch, &hit.window);
+    for (int r = 0; r < size; ++r)
+        for (int c = 0; c < size; ++c)
+            pixels[r * size + c] = static_cast<float>(patch.data[r * patch.stride + c]);
+    out[0] = hit.score;
+    descriptor.getFeature(pixels, size, size, out + 1);
+}
+
+std::vector<float> ILabsPostFilter::feature(IN_IMAGE const& image, ScoredWindow const& hit) const
+{
+    const int size = SCALED_FACE_SIZE;
+    IMAGE patch(size, size, size, nullptr);
+    if (patch.data == nullptr)
+        throw qv_operation_error("PostFilter patch allocation failed");
+    std::vector<float> pixels(size * size);
+    std::vector<float> out(descriptor.getLength() + 1);
+    extract(image, hit, patch, pixels.data(), out.data());
+    return out;
+}
+
 void ILabsPostFilter::filter(IN_IMAGE const& image, std::vector<ScoredWindow> const& input,
                              std::vector<ScoredWindow>* output) const
 {
@@ -64,20 +88,15 @@ void ILabsPostFilter::filter(IN_IMAGE const& image, std::vector<ScoredWindow> co
     if (patch.data == nullptr)
         throw qv_operation_error("PostFilter patch allocation failed");
     std::vector<float> pixels(size * size);
-    std::vector<float> feature(descriptor.getLength() + 1);
+    std::vector<float> values(descriptor.getLength() + 1);
 
     for (const ScoredWindow& hit : input) {
         if (classifier.preClassify(hit.score)) {
             output->push_back(hit);
             continue;
         }
-        image.CropScaleToImage(&patch, &hit.window);
-        for (int r = 0; r < size; ++r)
-            for (int c = 0; c < size; ++c)
-                pixels[r * size + c] = static_cast<float>(patch.data[r * patch.stride + c]);
-        feature[0] = hit.score;
-        descriptor.getFeature(pixels.data(), size, size, feature.data() + 1);
-        if (classifier.classify(hit.category, feature.data(), static_cast<int>(feature.size())))
+        extract(image, hit, patch, pixels.data(), values.data());
+        if (classifier.classify(hit.category, values.data(), static_cast<int>(values.size())))
             output->push_back(hit);
     }
 }

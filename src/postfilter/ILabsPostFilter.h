@@ -7,6 +7,8 @@
 #include "postfilter/LbpDescriptor.h"
 #include "postfilter/PostFilter.h"
 
+class IMAGE;
+
 // Passes hits with a high cascade score at once and judges the others by a
 // per-category quadratic classifier on [cascade score, LBP histogram of the
 // 24 x 24 patch]. Parameters: {"model":"<model path>"}.
@@ -37,11 +39,17 @@ public:
     void fromJson(std::string const& text) override;
     std::string name() const override;
 
+    // The 945 values a hit is judged by: its cascade score, then the LBP
+    // histogram of its window cropped and scaled to 24 x 24.
+    std::vector<float> feature(IN_IMAGE const& image, ScoredWindow const& hit) const;
+
     const ILabsClassifier& getClassifier() const { return classifier; }
     ILabsClassifier& getClassifier() { return classifier; }
     const LbpDescriptor& getDescriptor() const { return descriptor; }
 
 private:
+    void extract(IN_IMAGE const& image, ScoredWindow const& hit, IMAGE& patch, float* pixels, float* out) const;
+
     std::string modelPath;
     LbpDescriptor descriptor;
     ILabsClassifier classifier;

@@ -56,6 +56,31 @@ std::string LbpSvmPostFilter::name() const
     return "LBP_SVM_POSTFILTER";
 }
 
+void LbpSvmPostFilter::extract(IN_IMAGE const& image, ScoredWindow const& hit, IMAGE& patch, float* pixels,
+                               float* out) const
+{
+    const int size = SCALED_FACE_SIZE;
+    image.CropScaleToImage(&patch, &hit.window);
+    // The models of this filter were made on the transposed patch.
+    for (int r = 0; r < size; ++r)
+        for (int c = 0; c < size; ++c)
+            pixels[c * size + r] = static_cast<float>(patch.data[r * patch.stride + c]);
+    out[0] = hit.score;
+    descriptor.getFeature(pixels, size, size, out + 1);
+}
+
+std::vector<float> LbpSvmPostFilter::feature(IN_IMAGE const& image, ScoredWindow const& hit) const
+{
+    const int size = SCALED_FACE_SIZE;
+    IMAGE patch(size, size, size, nullptr);
+    if (patch.data == nullptr)
+        throw qv_operation_error("PostFilter patch allocation failed");
+    std::vector<float> pixels(size * size);
+    std::vector<float> out(descriptor.getLength() + 1);
+    extract(image, hit, patch, pixels.data(), out.data());
+    return out;
+}
+
 void LbpSvmPostFilter::filter(IN_IMAGE const& image, std::vector<ScoredWindow> const& input,
                               std::vector<ScoredWindow>* output) const
 {
@@ -68,18 +93,12 @@ void LbpSvmPostFilter::filter(IN_IMAGE const& image, std::vector<ScoredWindow> c
     if (patch.data == nullptr)
         throw qv_operation_error("PostFilter patch allocation failed");
     std::vector<float> pixels(size * size);
-    std::vector<float> feature(descriptor.getLength() + 1);
+    std::vector<float> values(descriptor.getLength() + 1);
 
     for (const ScoredWindow& hit : input) {
-        image.CropScaleToImage(&patch, &hit.window);
-        // The models of this filter were made on the transposed patch.
-        for (int r = 0; r < size; ++r)
-            for (int c = 0; c < size; ++c)
-                pixels[c * size + r] = static_cast<float>(patch.data[r * patch.stride + c]);
-        feature[0] = hit.score;
-        descriptor.getFeature(pixels.data(), size, size, feature.data() + 1);
+        extract(image, hit, patch, pixels.data(), values.data());
         const SvmClassifier& judge = hit.category == 0 ? primaryClassifier : secondaryClassifier;
-        if (judge.classify(feature.data(), static_cast<int>(feature.size())) == 1)
+        if (judge.classify(values.data(), static_cast<int>(values.size())) == 1)
             output->push_back(hit);
     }
 }

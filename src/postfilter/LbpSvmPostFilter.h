@@ -5,6 +5,8 @@
 
 #include "postfilter/LbpDescriptor.h"
 #include "postfilter/PostFilter.h"
+
+class IMAGE;
 #include "postfilter/SvmClassifier.h"
 
 // Judges every hit by a support vector classifier on [cascade score, LBP
@@ -34,10 +36,16 @@ public:
     void fromJson(std::string const& text) override;
     std::string name() const override;
 
+    // The 945 values a hit is judged by: its cascade score, then the LBP
+    // histogram of its window cropped to 24 x 24 and transposed.
+    std::vector<float> feature(IN_IMAGE const& image, ScoredWindow const& hit) const;
+
     SvmClassifier& getPrimaryClassifier() { return primaryClassifier; }
     SvmClassifier& getSecondaryClassifier() { return secondaryClassifier; }
 
 private:
+    void extract(IN_IMAGE const& image, ScoredWindow const& hit, IMAGE& patch, float* pixels, float* out) const;
+
     std::string modelPath;
     LbpDescriptor descriptor;
     SvmClassifier primaryClassifier;

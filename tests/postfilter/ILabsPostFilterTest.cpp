@@ -1,6 +1,9 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <random>
+#include <sstream>
+#include <string>
 #include <vector>
 
 #include "support/PostFilterModels.h"
@@ -156,5 +159,70 @@ TEST(ILabsConfiguration, ModelOfAnotherFeatureLengthFailsAtJudgement)
         FAIL() << "no exception";
     } catch (const qv_data_error& e) {
         EXPECT_STREQ(e.what(), "Incorrect PostFilter's feature length");
+    }
+}
+
+TEST(ILabsFeature, ToolMirrorGivesTheSameFeatureAndScore)
+{
+    // The model tools compute features in Python; they must agree bit for bit.
+    const int width = 97, height = 83;
+    if (!pftest::featureMirrorAvailable())
+        GTEST_SKIP() << "no system Python with numpy";
+    std::vector<uint8_t> pixels = pftest::noisyFrame(width, height);
+    const std::string framePath = ::testing::TempDir() + "pf_mirror_frame.raw";
+    pftest::writeFile(framePath, pixels);
+    IN_IMAGE image;
+    image.Init(width, height, width, pixels.data());
+
+    std::mt19937 rng(5);
+    std::vector<postfilterwriters::IlabsCategory> cats;
+    for (int c = 0; c < 15; ++c) {
+        postfilterwriters::IlabsCategory cat;
+        std::uniform_real_distribution<float> u(-0.05f, 0.05f);
+        for (int i = 0; i < pftest::kFeatureLength; ++i)
+            cat.linear.push_back(u(rng));
+        for (int r = 0; r < 3; ++r) {
+            cat.quadraticWeights.push_back(u(rng));
+            cat.leftRows.emplace_back();
+            cat.rightRows.emplace_back();
+            for (int i = 0; i < pftest::kFeatureLength; ++i) {
+                cat.leftRows.back().push_back(u(rng));
+                cat.rightRows.back().push_back(u(rng));
+            }
+        }
+        cat.bias = u(rng) * 10;
+        cats.push_back(cat);
+    }
+    const std::vector<uint8_t> payload = postfilterwriters::ilabsModelPayload(cats);
+    const std::string modelPath = ::testing::TempDir() + "pf_mirror_model.bin";
+    pftest::writeFile(modelPath, payload);
+    ScopedModel model("pf_ilabs_mirror", payload);
+    ILabsPostFilter filter("pf_ilabs_mirror");
+
+    // Whole-pixel, fractional and clipped windows, categories spread out.
+    const std::vector<ScoredWindow> hits = {hit(1.25f, 0, {0, 24, 0, 24}), hit(-3.5f, 7, {10, 60, 5, 55}),
+                                            hit(5.999f, 14, {33, 70, 20, 57}), hit(0.1f, 3, {80, 120, 60, 100}),
+                                            hit(2.0f, 9, {-7, 30, -4, 33})};
+    std::string args = "--frame " + framePath + " --width 97 --height 83";
+    for (const ScoredWindow& h : hits) {
+        std::ostringstream spec;
+        spec.precision(9);
+        spec << " --hit=" << h.window.left << "," << h.window.right << "," << h.window.top << ","
+             << h.window.bottom << "," << h.score << "," << h.category;
+        args += spec.str();
+    }
+    std::vector<std::string> features = pftest::runFeatureMirror(args);
+    std::vector<std::string> scores = pftest::runFeatureMirror(args + " --model " + modelPath);
+    ASSERT_EQ(features.size(), hits.size());
+    ASSERT_EQ(scores.size(), hits.size());
+    for (std::size_t i = 0; i < hits.size(); ++i) {
+        const std::vector<float> expected = filter.feature(image, hits[i]);
+        EXPECT_EQ(pftest::parseFloats(features[i]), expected) << "hit " << i;
+        const float score = filter.getClassifier().categoryScore(hits[i].category, expected.data(),
+                                                              static_cast<int>(expected.size()));
+        std::vector<float> mirrored = pftest::parseFloats(scores[i]);
+        ASSERT_EQ(mirrored.size(), 2u) << scores[i];
+        EXPECT_EQ(mirrored[0], score) << "hit " << i;
+        EXPECT_EQ(mirrored[1] == 1.0f, score > 0.0f);
     }
 }

@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include <string>
 #include <vector>
 
 #include "support/PostFilterModels.h"
@@ -103,4 +104,23 @@ TEST(LbpSvmConfiguration, NameJsonAndModelOfAnotherLength)
     f.fromJson("{\"model\":\"pf_svm_short\"}");
     EXPECT_EQ(f.toJson(), "{\"model\":\"pf_svm_short\"}");
     EXPECT_THROW(run(f, {hit(1.0f, 1)}), qv_data_error);
+}
+
+TEST(LbpSvmFeature, ToolMirrorGivesTheSameTransposedFeature)
+{
+    if (!pftest::featureMirrorAvailable())
+        GTEST_SKIP() << "no system Python with numpy";
+    const int width = 64, height = 50;
+    std::vector<uint8_t> pixels = pftest::noisyFrame(width, height, 23);
+    const std::string framePath = ::testing::TempDir() + "pf_mirror_svm_frame.raw";
+    pftest::writeFile(framePath, pixels);
+    IN_IMAGE image;
+    image.Init(width, height, width, pixels.data());
+    LbpSvmPostFilter filter;
+    ScoredWindow h = hit(-1.75f, 2);
+    h.window = {5, 49, 3, 47};
+    std::vector<std::string> lines = pftest::runFeatureMirror("--frame " + framePath +
+                                                              " --width 64 --height 50 --transpose --hit=5,49,3,47,-1.75");
+    ASSERT_EQ(lines.size(), 1u);
+    EXPECT_EQ(pftest::parseFloats(lines[0]), filter.feature(image, h));
 }

@@ -6,6 +6,12 @@
 // hits pass.
 
 #include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <random>
+#include <sstream>
+#include <string>
 #include <vector>
 
 #include "PostFilterWriters.h"
@@ -68,6 +74,54 @@ inline std::vector<uint8_t> halfRampFrame() {
     for (int y = 0; y < 24; ++y)
         for (int x = 0; x < 12; ++x) pixels[y * 24 + x] = static_cast<uint8_t>(10 * x + 5 * y);
     return pixels;
+}
+
+// A noisy frame with smooth blobs, fixed seed: textured enough that every
+// LBP code and every cell sees use.
+inline std::vector<uint8_t> noisyFrame(int width, int height, uint32_t seed = 11) {
+    std::mt19937 rng(seed);
+    std::vector<uint8_t> pixels(static_cast<std::size_t>(width) * height);
+    for (int y = 0; y < height; ++y)
+        for (int x = 0; x < width; ++x)
+            pixels[y * width + x] = static_cast<uint8_t>((x * 3 + y * 5) % 97 + rng() % 140);
+    return pixels;
+}
+
+inline void writeFile(const std::string& path, const std::vector<uint8_t>& bytes) {
+    std::ofstream out(path, std::ios::binary);
+    out.write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+}
+
+// True when tools/ilabs_feature.py can run here (system Python with numpy,
+// source dir known to the test).
+inline bool featureMirrorAvailable() {
+    return std::getenv("QUORIN_SOURCE_DIR") != nullptr &&
+           std::system("/usr/bin/python3 -c 'import numpy' >/dev/null 2>&1") == 0;
+}
+
+// Runs tools/ilabs_feature.py with `args` and returns its output lines.
+inline std::vector<std::string> runFeatureMirror(const std::string& args) {
+    const char* source = std::getenv("QUORIN_SOURCE_DIR");
+    std::vector<std::string> lines;
+    if (source == nullptr) return lines;
+    const std::string command = std::string("/usr/bin/python3 ") + source + "/tools/ilabs_feature.py " + args;
+    FILE* pipe = popen(command.c_str(), "r");
+    if (pipe == nullptr) return lines;
+    std::string text;
+    char chunk[4096];
+    std::size_t n;
+    while ((n = std::fread(chunk, 1, sizeof chunk, pipe)) > 0) text.append(chunk, n);
+    pclose(pipe);
+    std::istringstream in(text);
+    for (std::string line; std::getline(in, line);) lines.push_back(line);
+    return lines;
+}
+
+inline std::vector<float> parseFloats(const std::string& line) {
+    std::istringstream in(line);
+    std::vector<float> values;
+    for (float v; in >> v;) values.push_back(v);
+    return values;
 }
 
 }  // namespace pftest
