@@ -299,6 +299,57 @@ def reference_run(net, inputs):
     return work[last:last + n], best[0]
 
 
+# ---- quantisation of a float MLP ---------------------------------------------
+
+ACC_LIMIT = 2 ** 31 - 1
+
+
+def quantise_mlp(layers, input_mean, input_std, spread=4.0, version=12):
+    """Integer net from a float MLP trained on u = (x - mean) / (spread * std),
+    clipped to [-1, 1], where x is the locator's input (pixel times the gain
+    that makes the patch sum 211676).
+
+    layers: list of (W, b, kind) with W[out][in] floats, b[out] floats, kind
+    "sigmoid" (hidden) or "linear" (output in units of the rectangle, the
+    locator divides the output by 65535). Every layer gets the largest weight
+    scale S (also its divisor) for which the worst-case accumulator
+    |bias| + sum |w| * max|activation| fits in 32 bits, so nothing can wrap.
+    Inputs below -spread deviations saturate to +1 in the library: pick spread
+    so that this is rare on the training set. Returns the net and the scales.
+    """
+    n = len(input_mean)
+    net = Net([n] + [len(b) for _, b, _ in layers],
+              [TXF_LINEAR] + [TXF_SIGMOID if k == "sigmoid" else TXF_LINEAR for _, _, k in layers],
+              [1] * (len(layers) + 1), version)
+    net.input_offsets = [int(round(m * 65535)) for m in input_mean]
+    net.input_divisors = [max(1, int(round(spread * s))) for s in input_std]
+    net.input_means = [0] * n
+    scales = []
+    act_max = 65535  # inputs and sigmoid outputs alike reach 1.0 in 16.16
+    for l, (W, b, kind) in enumerate(layers, start=1):
+        W = [[float(v) for v in row] for row in W]
+        b = [float(v) for v in b]
+        out_unit = 65536 if kind == "sigmoid" else 65535
+        worst_w = max(sum(abs(v) for v in row) for row in W) or 1e-9
+        worst_b = max(abs(v) for v in b) if b else 0.0
+        # S * (worst_w * act_max + worst_b * out_unit) <= ACC_LIMIT, S <= 65535, |w| <= 32767
+        s = min(65535.0, ACC_LIMIT / (worst_w * act_max + worst_b * out_unit + 1),
+                32767.0 / max(max(abs(v) for row in W for v in row), 1e-9))
+        s = int(s)
+        if s < 16:
+            raise ValueError("layer %d: weights too large for 16-bit weights and 32-bit sums" % l)
+        # The activation unit is 65535 or 65536; out = acc / S in out_unit.
+        rows = [[int(round(v * s * out_unit / (act_max + 1))) for v in row] for row in W]
+        biases = [int(round(v * s * out_unit)) for v in b]
+        for r, bias in zip(rows, biases):
+            if sum(abs(w) for w in r) * act_max + abs(bias) > ACC_LIMIT:
+                raise ValueError("layer %d: accumulator could overflow" % l)
+        net.set_dense(l, rows, biases)
+        net.divisors[l] = s
+        scales.append(s)
+    return net, scales
+
+
 # ---- programs ----------------------------------------------------------------
 
 def mean_shape_net(side=8):
@@ -311,18 +362,50 @@ def mean_shape_net(side=8):
 
 
 def demo_net(seed):
+    """A random float MLP 9-6-4 quantised, plus odd parts the quantiser never
+    makes (an absolute, saturating layer and a soft-max), for the cross-check."""
     rnd = random.Random(seed)
-    net = Net([9, 6, 5, 4], [0, TXF_SIGMOID, TXF_ABS, TXF_SOFTMAX], [1, 1024, 0, 65535])
-    net.input_divisors = [rnd.randint(1, 9000) for _ in range(9)]
-    net.input_offsets = [rnd.randint(-10 ** 9, 10 ** 9) for _ in range(9)]
+    float_layers = [([[rnd.uniform(-1, 1) for _ in range(9)] for _ in range(6)], [rnd.uniform(-.5, .5) for _ in range(6)], "sigmoid"),
+                    ([[rnd.uniform(-1, 1) for _ in range(6)] for _ in range(4)], [rnd.uniform(0, .5) for _ in range(4)], "linear")]
+    q, _ = quantise_mlp(float_layers, [rnd.uniform(100, 900) for _ in range(9)], [rnd.uniform(20, 300) for _ in range(9)])
+    net = Net([9, 6, 5, 4], [0, TXF_SIGMOID, TXF_ABS, TXF_SOFTMAX], [1, q.divisors[1], 0, 65535])
+    net.input_divisors, net.input_offsets = q.input_divisors, q.input_offsets
     net.input_means = [rnd.randint(-500, 500) for _ in range(9)]
-    for l, r in ((1, 300), (2, 20), (3, 200)):
+    net.spans[1], net.biases[1] = q.spans[1], q.biases[1]
+    for l, r in ((2, 20), (3, 200)):
         rows = [[rnd.randint(-r, r) for _ in range(net.layer_sizes[l - 1])] for _ in range(net.layer_sizes[l])]
         net.set_dense(l, rows, [rnd.randint(-30000, 30000) for _ in range(net.layer_sizes[l])] if l != 2 else None)
     # Split one neuron's run in two to cover several spans per source.
     first, weights = net.spans[2][1][0]
     net.spans[2][1] = [(first, weights[:2]), (first + 2, weights[2:])]
     return net
+
+
+def float_mlp_run(layers, input_mean, input_std, spread, x):
+    u = [max(-1.0, min(1.0, (xi - m) / (spread * s))) for xi, m, s in zip(x, input_mean, input_std)]
+    for W, b, kind in layers:
+        u = [sum(w * v for w, v in zip(row, u)) + bb for row, bb in zip(W, b)]
+        if kind == "sigmoid":
+            u = [1.0 / (1.0 + math.exp(-v)) for v in u]
+    return u
+
+
+def check_quantiser(seed=5, trials=200):
+    """Largest error, in rectangle units, of a quantised random landmark MLP."""
+    rnd = random.Random(seed)
+    n, h = 64, 16
+    mean = [rnd.uniform(100, 900) for _ in range(n)]
+    std = [rnd.uniform(20, 300) for _ in range(n)]
+    layers = [([[rnd.gauss(0, .3) for _ in range(n)] for _ in range(h)], [rnd.gauss(0, .3) for _ in range(h)], "sigmoid"),
+              ([[rnd.gauss(0, .3) for _ in range(h)] for _ in range(10)], [rnd.uniform(.2, .8) for _ in range(10)], "linear")]
+    net, _ = quantise_mlp(layers, mean, std)
+    worst = 0.0
+    for _ in range(trials):
+        x = [int(rnd.gauss(m, s)) for m, s in zip(mean, std)]
+        want = float_mlp_run(layers, mean, std, 4.0, x)
+        got, _ = reference_run(net, x)
+        worst = max(worst, max(abs(g / 65535.0 - w) for g, w in zip(got, want)))
+    return worst
 
 
 def main(argv=None):
@@ -335,7 +418,11 @@ def main(argv=None):
     d.add_argument("--out-dir", required=True)
     d.add_argument("--seed", type=int, default=1)
     d.add_argument("--cases", type=int, default=25)
+    sub.add_parser("check-quant", help="print the worst error of a quantised random landmark MLP")
     args = ap.parse_args(argv)
+    if args.command == "check-quant":
+        print("worst output error %.6f of the rectangle" % check_quantiser())
+        return 0
     if args.command == "mean-shape":
         with open(args.out, "wb") as f:
             f.write(write_container([write_blob(mean_shape_net(args.side))]))
