@@ -34,7 +34,11 @@ void FacePartLocator::init(const std::string& parameters) {
 
 void FacePartLocator::Init(const char* path) {
     classifier_.reset();
+    // A patch of the old net must not feed the new one.
     ready_ = 0;
+    patch_.reset();
+    netInput_.reset();
+    patchWidth_ = patchHeight_ = 0;
     classifier_.reset(new NeuralClassifier());
     classifier_->loadFromPath(path);
     preparePatch();

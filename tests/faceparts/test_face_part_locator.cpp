@@ -70,6 +70,7 @@ TEST_F(LocatorTest, PatchSideComesFromAPerfectSquareInputCount) {
 }
 
 TEST_F(LocatorTest, NonSquareInputCountLeavesTheLocatorUnusable) {
+    load(landmarkNet(8, 10, kShape));  // the earlier patch must not feed the new net
     NetDescription d = netwriter::denseNet({1000, 10}, {0, TXF_LINEAR}, {1, 1}, 1, 0, true, 10);
     load(d);
     EXPECT_FALSE(locator_.ready());
