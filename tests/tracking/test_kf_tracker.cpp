@@ -32,32 +32,6 @@ std::vector<DetectionWindow> previous(KFTracker& t)
 
 } // namespace
 
-TEST(KalmanModel, MatricesHoldTheWhiteAccelerationModel)
-{
-    KFTracker t;
-    ASSERT_EQ(KFTracker::F.rows(), 6);
-    EXPECT_FLOAT_EQ(KFTracker::F(0, 4), 1.0f);
-    EXPECT_FLOAT_EQ(KFTracker::F(3, 5), 1.0f);
-    EXPECT_FLOAT_EQ(KFTracker::F(0, 2), 0.0f) << "edges are not coupled";
-    EXPECT_FLOAT_EQ(KFTracker::Q(4, 2), 0.5f);
-    EXPECT_FLOAT_EQ(KFTracker::Q(1, 1), 0.25f);
-    EXPECT_FLOAT_EQ(KFTracker::Q(4, 5), 0.0f);
-    EXPECT_EQ(KFTracker::H.rows(), 4);
-    EXPECT_FLOAT_EQ(KFTracker::H.block(0, 4, 4, 2).cwiseAbs().sum(), 0.0f);
-    EXPECT_FLOAT_EQ(KFTracker::R(2, 2), 42.25f);
-    EXPECT_EQ(t.name(), "KF_TRACKER");
-}
-
-TEST(KalmanModel, NewFaceStartsUncertainWithoutObservation)
-{
-    KFTracker::TrackFace f;
-    EXPECT_EQ(f.state.size(), 6);
-    EXPECT_FLOAT_EQ(f.state.cwiseAbs().sum(), 0.0f);
-    EXPECT_EQ(f.observation.size(), 0);
-    EXPECT_FLOAT_EQ(f.covariance(3, 3), 10000.0f);
-    EXPECT_FLOAT_EQ(f.covariance(3, 4), 0.0f);
-}
-
 TEST(KalmanTrack, NewTrackPredictsItsDetection)
 {
     KFTracker t;
@@ -141,13 +115,6 @@ TEST(KalmanTrack, ReusedSlotStartsAFreshFilter)
     EXPECT_FLOAT_EQ(f.state[4], 0.0f);
     EXPECT_FLOAT_EQ(f.covariance(0, 0), 10000.0f);
     EXPECT_FLOAT_EQ(f.state[0], 300.0f);
-}
-
-TEST(KalmanTrack, LeavesTheBaseListUnused)
-{
-    KFTracker t;
-    step(t, {makeWindow(0, 0, 40, 40)});
-    EXPECT_TRUE(t.faces.items.empty());
 }
 
 TEST(KalmanTrack, DivergedStateDoesNotBreakTheIntConversions)

@@ -39,42 +39,25 @@ int liveCount(const Tracker& t)
 
 } // namespace
 
-TEST(TrackerMatch, PicksLargestFirstThenTheRest)
+TEST(TrackerMatch, GreedyBestFirstWithRowMajorTies)
 {
-    std::vector<std::vector<float>> s = {{0.4f, 0.9f}, {0.8f, 0.5f}};
-    std::vector<int> a;
-    Tracker::match(s, &a);
-    ASSERT_EQ(a.size(), 2u);
-    EXPECT_EQ(a[0], 1);
-    EXPECT_EQ(a[1], 0);
-}
-
-TEST(TrackerMatch, GreedyNotOptimal)
-{
-    // Optimal total would pair (0,1) and (1,0); greedy takes 0.9 first and
-    // leaves row 1 with nothing above zero.
-    std::vector<std::vector<float>> s = {{0.9f, 0.8f}, {0.85f, 0.0f}};
-    std::vector<int> a;
-    Tracker::match(s, &a);
-    EXPECT_EQ(a[0], 0);
-    EXPECT_EQ(a[1], -1);
-}
-
-TEST(TrackerMatch, TieGoesToFirstInRowMajorOrder)
-{
-    std::vector<std::vector<float>> s = {{0.0f, 0.5f}, {0.5f, 0.5f}};
-    std::vector<int> a;
-    Tracker::match(s, &a);
-    EXPECT_EQ(a[0], 1);
-    EXPECT_EQ(a[1], 0);
-}
-
-TEST(TrackerMatch, NeverSelectsZeroOrNegative)
-{
-    std::vector<std::vector<float>> s = {{0.0f, -1.0f}, {0.0f, 0.0f}};
-    std::vector<int> a;
-    Tracker::match(s, &a);
-    EXPECT_EQ(a, (std::vector<int>{-1, -1}));
+    struct Case {
+        std::vector<std::vector<float>> scores;
+        std::vector<int> expected;
+        const char* why;
+    };
+    const Case cases[] = {
+        {{{0.4f, 0.9f}, {0.8f, 0.5f}}, {1, 0}, "largest first, then the rest"},
+        {{{0.9f, 0.8f}, {0.85f, 0.0f}}, {0, -1}, "greedy, not the best total"},
+        {{{0.0f, 0.5f}, {0.5f, 0.5f}}, {1, 0}, "a tie goes to the first in row-major order"},
+        {{{0.0f, -1.0f}, {0.0f, 0.0f}}, {-1, -1}, "zero and below are never chosen"},
+        {{{0.2f, 0.3f}, {0.9f}, {0.1f, 0.1f, 0.99f}}, {1, 0, -1}, "ragged rows: the first row's width counts"},
+    };
+    for (const Case& c : cases) {
+        std::vector<int> a;
+        Tracker::match(c.scores, &a);
+        EXPECT_EQ(a, c.expected) << c.why;
+    }
 }
 
 TEST(TrackerMatch, EmptyInputsLeaveAssignmentAlone)
@@ -85,14 +68,6 @@ TEST(TrackerMatch, EmptyInputsLeaveAssignmentAlone)
     Tracker::match({{}, {}}, &a);
     EXPECT_EQ(a, (std::vector<int>{-1, -1})) << "rows but no columns: all unassigned";
     Tracker::match({{1.0f}}, nullptr); // must not crash
-}
-
-TEST(TrackerMatch, RaggedRowsReadAsZeroPadded)
-{
-    std::vector<std::vector<float>> s = {{0.2f, 0.3f}, {0.9f}, {0.1f, 0.1f, 0.99f}};
-    std::vector<int> a;
-    Tracker::match(s, &a);
-    EXPECT_EQ(a, (std::vector<int>{1, 0, -1})) << "columns beyond the first row's width do not exist";
 }
 
 TEST(TrackerUpdate, EmptyFrameOnEmptyTrackerOnlyCounts)
