@@ -37,6 +37,59 @@ const char* trackerDescription(QVFaceTrackingMode mode)
     }
 }
 
+// Matches the post-filtered new hits against the tracked hits, grows tracked
+// windows to a wider match, and appends the unmatched new ones.
+void joinNewHits(std::vector<ScoredWindow>& trackedHits, const std::vector<ScoredWindow>& finalHits, int width,
+                 int height)
+{
+    const size_t tracked = trackedHits.size();
+    const size_t fresh = finalHits.size();
+
+    // Greedy best-first on overlaps, the same assignment the trackers use:
+    // rows are tracked hits, columns new ones.
+    std::vector<int> columnOfRow;
+    if (tracked > 0 && fresh > 0) {
+        std::vector<std::vector<float>> overlap(tracked, std::vector<float>(fresh, 0.0f));
+        for (size_t i = 0; i < tracked; ++i)
+            for (size_t j = 0; j < fresh; ++j) {
+                const float v = trackedHits[i].window.Overlap(finalHits[j].window);
+                overlap[i][j] = double(v) < kMinOverlap ? 0.0f : v;
+            }
+        Tracker::match(overlap, &columnOfRow);
+    }
+    std::vector<int> rowOfColumn(fresh, -1);
+    for (size_t i = 0; i < columnOfRow.size(); ++i)
+        if (columnOfRow[i] >= 0) rowOfColumn[size_t(columnOfRow[i])] = int(i);
+
+    for (size_t j = 0; j < fresh; ++j) {
+        const int i = rowOfColumn[j];
+        if (i < 0) {
+            trackedHits.push_back(finalHits[j]); // a new face
+            continue;
+        }
+        // A wider new hit grows the tracked window around its own centre, as
+        // long as it stays inside the frame; score and category stay those of
+        // the tracked hit. Only widths decide.
+        DetectionWindow& t = trackedHits[size_t(i)].window;
+        const DetectionWindow& n = finalHits[j].window;
+        const int newWidth = n.right - n.left;
+        const int newHeight = n.bottom - n.top;
+        if (newWidth <= t.right - t.left) continue;
+        const int dW = newWidth - (t.right - t.left);
+        const int dH = newHeight - (t.bottom - t.top);
+        const int left = t.left - dW / 2;
+        const int right = left + newWidth;
+        const int top = t.top - dH / 2;
+        const int bottom = top + newHeight;
+        if (left >= 0 && right < width && top >= 0 && bottom < height) {
+            t.left = left;
+            t.right = right;
+            t.top = top;
+            t.bottom = bottom;
+        }
+    }
+}
+
 } // namespace
 
 FaceDetector::FaceDetector() = default;
@@ -161,7 +214,7 @@ void FaceDetector::detect(const unsigned char* gray, int width, int height, std:
     postFilter->filter(image, mergedHits, &finalHits);
 
     if (tracker != nullptr) {
-        joinNewHits(width, height);
+        joinNewHits(trackedHits, finalHits, width, height);
         finalHits.clear();
         merger->mergeWindows(trackedHits, finalHits);
         std::vector<DetectionWindow> windows;
@@ -175,55 +228,5 @@ void FaceDetector::detect(const unsigned char* gray, int width, int height, std:
         const DetectionWindow& w = finalHits[i].window;
         faces[i].setFaceRect(Rect2<int32_t>(w.left, w.top, w.right, w.bottom));
         faces[i].setFaceScore(finalHits[i].score);
-    }
-}
-
-void FaceDetector::joinNewHits(int width, int height)
-{
-    const size_t tracked = trackedHits.size();
-    const size_t fresh = finalHits.size();
-
-    // Greedy best-first on overlaps, the same assignment the trackers use:
-    // rows are tracked hits, columns new ones.
-    std::vector<int> columnOfRow;
-    if (tracked > 0 && fresh > 0) {
-        std::vector<std::vector<float>> overlap(tracked, std::vector<float>(fresh, 0.0f));
-        for (size_t i = 0; i < tracked; ++i)
-            for (size_t j = 0; j < fresh; ++j) {
-                const float v = trackedHits[i].window.Overlap(finalHits[j].window);
-                overlap[i][j] = double(v) < kMinOverlap ? 0.0f : v;
-            }
-        Tracker::match(overlap, &columnOfRow);
-    }
-    std::vector<int> rowOfColumn(fresh, -1);
-    for (size_t i = 0; i < columnOfRow.size(); ++i)
-        if (columnOfRow[i] >= 0) rowOfColumn[size_t(columnOfRow[i])] = int(i);
-
-    for (size_t j = 0; j < fresh; ++j) {
-        const int i = rowOfColumn[j];
-        if (i < 0) {
-            trackedHits.push_back(finalHits[j]); // a new face
-            continue;
-        }
-        // A wider new hit grows the tracked window around its own centre, as
-        // long as it stays inside the frame; score and category stay those of
-        // the tracked hit. Only widths decide.
-        DetectionWindow& t = trackedHits[size_t(i)].window;
-        const DetectionWindow& n = finalHits[j].window;
-        const int newWidth = n.right - n.left;
-        const int newHeight = n.bottom - n.top;
-        if (newWidth <= t.right - t.left) continue;
-        const int dW = newWidth - (t.right - t.left);
-        const int dH = newHeight - (t.bottom - t.top);
-        const int left = t.left - dW / 2;
-        const int right = left + newWidth;
-        const int top = t.top - dH / 2;
-        const int bottom = top + newHeight;
-        if (left >= 0 && right < width && top >= 0 && bottom < height) {
-            t.left = left;
-            t.right = right;
-            t.top = top;
-            t.bottom = bottom;
-        }
     }
 }

@@ -62,10 +62,6 @@ public:
     const Tracker* currentTracker() const { return tracker; }
 
 private:
-    // Matches the post-filtered new hits against the tracked hits, grows
-    // tracked windows to a wider match, and appends the unmatched new ones.
-    void joinNewHits(int width, int height);
-
     CascadeDetector* detector = nullptr;
     WindowMerger* merger = nullptr;
     PostFilter* postFilter = nullptr;
