@@ -306,12 +306,14 @@ int quorin_detect(unsigned char* image, int width, int height, int* results, int
     if (scale < 1.0f) {
         w = static_cast<int32_t>(scale * static_cast<float>(width));
         h = static_cast<int32_t>(scale * static_cast<float>(height));
-        if (w < 1 || h < 1) {
-            // So elongated that a side shrinks to nothing: no face can be in it.
+        // So elongated that a side shrinks to nothing: no face can be in it.
+        // The buffer test can't fail for the three targets; it keeps the
+        // resize inside its memory whatever the table holds.
+        if (w < 1 || h < 1 || static_cast<std::size_t>(w) * static_cast<std::size_t>(h) > kFrameBufferBytes ||
+            !resizeNearest(image, width, height, g_frameBuffer, w, h)) {
             forgetHistory();
             return 0;
         }
-        resizeNearest(image, width, height, g_frameBuffer, w, h);
         work = g_frameBuffer;
         // The turned frame goes back into the host's memory, which is at least
         // as large as the shrunk one.

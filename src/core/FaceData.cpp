@@ -25,6 +25,10 @@ void readField(const std::map<std::string, std::string>& items, const char* key,
 FaceData::FaceData()
     : faceScore_(std::numeric_limits<float>::lowest()), goodFace_(true), personID_(-1), age_(-1.0f) {}
 
+Point2<float> FaceData::landmark(const std::string& name) const { return landmarks_.landmark(name); }
+
+void FaceData::setLandmark(const std::string& name, const Point2<float>& p) { landmarks_.setLandmark(name, p); }
+
 int32_t FaceData::faceWidth() const {
     return static_cast<int32_t>(static_cast<uint32_t>(faceRect_.right) - static_cast<uint32_t>(faceRect_.left));
 }

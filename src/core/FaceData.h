@@ -31,8 +31,9 @@ public:
     void setFaceScore(float s) { faceScore_ = s; }
 
     // Throws std::invalid_argument "No value available for the input landmark".
-    Point2<float> landmark(const std::string& name) const { return landmarks_.landmark(name); }
-    void setLandmark(const std::string& name, const Point2<float>& p) { landmarks_.setLandmark(name, p); }
+    // Out of line so that a host reaches them through this exported class.
+    Point2<float> landmark(const std::string& name) const;
+    void setLandmark(const std::string& name, const Point2<float>& p);
     const LandmarkMap& landmarks() const { return landmarks_; }
 
     bool isGoodFace() const { return goodFace_; }
