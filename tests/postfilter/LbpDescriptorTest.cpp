@@ -9,21 +9,21 @@
 
 namespace {
 
-// Histogram of a 3 x 3 image of `base` whose neighbour at (dx, dy) is `other`:
-// one counted pixel, the center.
-std::vector<float> centerHistogram(float base, int dx, int dy, float other)
+std::vector<float> histogram(const LbpDescriptor& d, const std::vector<float>& image, int width, int height)
 {
-    std::vector<float> image(9, base);
-    image[(1 + dy) * 3 + (1 + dx)] = other;
-    LbpDescriptor d(1, 1);
     std::vector<float> h(d.getLength(), -1.0f);
-    d.getFeature(image.data(), 3, 3, h.data());
+    d.getFeature(image.data(), width, height, h.data());
     return h;
 }
 
-int onlyBin(const std::vector<float>& h)
+// The one bin hit by the center of a 3 x 3 image of 10 whose neighbour at
+// (dx, dy) is `other`.
+int centerCode(int dx, int dy, float other)
 {
-    EXPECT_FLOAT_EQ(std::accumulate(h.begin(), h.end(), 0.0f), 1.0f);
+    std::vector<float> image(9, 10.0f);
+    image[(1 + dy) * 3 + (1 + dx)] = other;
+    std::vector<float> h = histogram(LbpDescriptor(1, 1), image, 3, 3);
+    EXPECT_EQ(std::accumulate(h.begin(), h.end(), 0.0f), 1.0f);
     return static_cast<int>(std::max_element(h.begin(), h.end()) - h.begin());
 }
 
@@ -32,131 +32,68 @@ int onlyBin(const std::vector<float>& h)
 TEST(LbpPatternTable, NumbersUniformPatternsInAscendingOrder)
 {
     const auto& lut = LbpDescriptor::LBP_LUT;
-    EXPECT_EQ(lut[0], 0);
-    EXPECT_EQ(lut[1], 1);
-    EXPECT_EQ(lut[2], 2);
-    EXPECT_EQ(lut[3], 3);
-    EXPECT_EQ(lut[4], 4);
-    EXPECT_EQ(lut[5], 58); // 00000101: four changes
-    EXPECT_EQ(lut[6], 5);
-    EXPECT_EQ(lut[7], 6);
-    EXPECT_EQ(lut[8], 7);
-    EXPECT_EQ(lut[17], 58);
-    EXPECT_EQ(lut[129], 30); // 10000001: wraps around the circle, uniform
-    EXPECT_EQ(lut[254], 56);
-    EXPECT_EQ(lut[255], 57);
+    // Uniform patterns in order: 0 1 2 3 4 6 7 8 ...; 5 and 17 change four times.
+    const int pattern[] = {0, 1, 2, 3, 4, 5, 6, 7, 8, 17, 129, 254, 255};
+    const int code[] = {0, 1, 2, 3, 4, 58, 5, 6, 7, 58, 30, 56, 57};
+    for (int i = 0; i < 13; ++i)
+        EXPECT_EQ(lut[pattern[i]], code[i]) << pattern[i];
     EXPECT_EQ(std::count(lut.begin(), lut.end(), 58), 256 - 58);
-}
-
-TEST(LbpDescriptorShape, LengthIsCellsTimesBins)
-{
-    EXPECT_EQ(LbpDescriptor().getLength(), 0);
     EXPECT_EQ(LbpDescriptor(4, 4).getLength(), 944);
-    EXPECT_EQ(LbpDescriptor(3, 2).getLength(), 354);
 }
 
-TEST(LbpDescriptorShape, RejectsNegativeOrOversizedGridAndKeepsOldOne)
+TEST(LbpDescriptorPattern, NeighboursSetBitsClockwiseFromTopLeftOnlyWhenStrictlyBrighter)
 {
-    LbpDescriptor d(4, 4);
-    EXPECT_THROW(d.init(-1, 4), qv_invalid_argument);
-    EXPECT_THROW(d.init(1 << 20, 1 << 20), qv_invalid_argument);
-    EXPECT_EQ(d.getLength(), 944);
-}
-
-TEST(LbpDescriptorPattern, EachNeighbourSetsItsOwnBitClockwiseFromTopLeft)
-{
-    // (dx, dy) -> bit value, then through the table.
-    EXPECT_EQ(onlyBin(centerHistogram(10, -1, -1, 20)), LbpDescriptor::LBP_LUT[1]);
-    EXPECT_EQ(onlyBin(centerHistogram(10, 0, -1, 20)), LbpDescriptor::LBP_LUT[2]);
-    EXPECT_EQ(onlyBin(centerHistogram(10, 1, -1, 20)), LbpDescriptor::LBP_LUT[4]);
-    EXPECT_EQ(onlyBin(centerHistogram(10, 1, 0, 20)), 7);   // 8
-    EXPECT_EQ(onlyBin(centerHistogram(10, 1, 1, 20)), 11);  // 16
-    EXPECT_EQ(onlyBin(centerHistogram(10, 0, 1, 20)), 16);  // 32
-    EXPECT_EQ(onlyBin(centerHistogram(10, -1, 1, 20)), 22); // 64
-    EXPECT_EQ(onlyBin(centerHistogram(10, -1, 0, 20)), 29); // 128
-}
-
-TEST(LbpDescriptorPattern, ComparisonIsStrict)
-{
-    // Equal neighbours set nothing: a flat image is code 0 everywhere.
-    EXPECT_EQ(onlyBin(centerHistogram(10, 1, 0, 10)), 0);
-    // A dark center below all eight: 255 -> 57.
-    std::vector<float> image(9, 5.0f);
-    image[4] = 4.5f;
-    LbpDescriptor d(1, 1);
-    std::vector<float> h(d.getLength());
-    d.getFeature(image.data(), 3, 3, h.data());
-    EXPECT_EQ(onlyBin(h), 57);
-    // A bright center is a local maximum: code 0.
-    EXPECT_EQ(onlyBin(centerHistogram(10, 0, 0, 99)), 0);
+    // (dx, dy) -> code of the bit 1, 2, 4 ... 128 through the table.
+    const int dx[] = {-1, 0, 1, 1, 1, 0, -1, -1};
+    const int dy[] = {-1, -1, -1, 0, 1, 1, 1, 0};
+    const int code[] = {1, 2, 4, 7, 11, 16, 22, 29};
+    for (int i = 0; i < 8; ++i) {
+        EXPECT_EQ(centerCode(dx[i], dy[i], 20.0f), code[i]) << i;
+        EXPECT_EQ(centerCode(dx[i], dy[i], 10.0f), 0) << "equal neighbour " << i;
+    }
+    EXPECT_EQ(centerCode(0, 0, 99.0f), 0);  // a local maximum
+    EXPECT_EQ(centerCode(0, 0, 9.5f), 57);  // darker than all eight: 255
 }
 
 TEST(LbpDescriptorCells, FlatPatchCountsInteriorPixelsPerCellInBinZero)
 {
-    std::vector<float> image(24 * 24, 7.0f);
-    LbpDescriptor d(4, 4);
-    std::vector<float> h(d.getLength(), 3.0f);
-    d.getFeature(image.data(), 24, 24, h.data());
-    // Border cells lose the frame's outer row or column: 5 or 6 pixels a side.
-    const int side[4] = {5, 6, 6, 5};
+    std::vector<float> h = histogram(LbpDescriptor(4, 4), std::vector<float>(24 * 24, 7.0f), 24, 24);
+    const int side[4] = {5, 6, 6, 5}; // border cells lose the outer row or column
     for (int row = 0; row < 4; ++row)
         for (int col = 0; col < 4; ++col) {
             const float* cell = h.data() + (row * 4 + col) * 59;
-            EXPECT_FLOAT_EQ(cell[0], float(side[row] * side[col])) << row << "," << col;
-            EXPECT_FLOAT_EQ(std::accumulate(cell + 1, cell + 59, 0.0f), 0.0f);
+            EXPECT_EQ(cell[0], float(side[row] * side[col])) << row << "," << col;
+            EXPECT_EQ(std::accumulate(cell + 1, cell + 59, 0.0f), 0.0f);
         }
 }
 
-TEST(LbpDescriptorCells, CellIndexRunsAlongRowsThenDown)
+TEST(LbpDescriptorCells, CellsRunAlongRowsThenDownAndTheRemainderCountsNowhere)
 {
-    // 2 cells across, 1 down, on an 8 x 4 image: a dark pixel at x 5 lands in
-    // the right cell, which is the second block of 59 bins.
-    std::vector<float> image(8 * 4, 50.0f);
-    image[1 * 8 + 5] = 1.0f;
-    LbpDescriptor d(2, 1);
-    std::vector<float> h(d.getLength());
-    d.getFeature(image.data(), 8, 4, h.data());
-    EXPECT_FLOAT_EQ(h[59 + 57], 1.0f);
-    EXPECT_FLOAT_EQ(h[57], 0.0f);
-
-    // 1 across, 2 down, on a 4 x 8 image: the same pixel transposed.
-    std::vector<float> tall(4 * 8, 50.0f);
+    // 2 x 1 cells on 8 x 4: a dark pixel at x 5 is in the second block of bins;
+    // 1 x 2 cells on 4 x 8: the same pixel transposed, the same block.
+    std::vector<float> wide(8 * 4, 50.0f), tall(4 * 8, 50.0f);
+    wide[1 * 8 + 5] = 1.0f;
     tall[5 * 4 + 1] = 1.0f;
-    LbpDescriptor t(1, 2);
-    std::vector<float> ht(t.getLength());
-    t.getFeature(tall.data(), 4, 8, ht.data());
-    EXPECT_FLOAT_EQ(ht[59 + 57], 1.0f);
+    EXPECT_EQ(histogram(LbpDescriptor(2, 1), wide, 8, 4)[59 + 57], 1.0f);
+    EXPECT_EQ(histogram(LbpDescriptor(1, 2), tall, 4, 8)[59 + 57], 1.0f);
+    // 26 x 26 in 4 x 4 cells of 6: column and row 24 would be a fifth cell.
+    std::vector<float> h = histogram(LbpDescriptor(4, 4), std::vector<float>(26 * 26, 1.0f), 26, 26);
+    EXPECT_EQ(std::accumulate(h.begin(), h.end(), 0.0f), 23.0f * 23.0f);
+    // Fewer than 3 rows: nothing counts, but every bin is cleared.
+    std::vector<float> flat = histogram(LbpDescriptor(4, 4), std::vector<float>(24 * 2, 1.0f), 24, 2);
+    EXPECT_TRUE(std::all_of(flat.begin(), flat.end(), [](float v) { return v == 0.0f; }));
 }
 
-TEST(LbpDescriptorCells, RemainderOfTheCellDivisionCountsNowhere)
-{
-    // 26 wide, 4 cells: cells are 6 wide and column 24 falls into a fifth cell.
-    std::vector<float> image(26 * 26, 1.0f);
-    LbpDescriptor d(4, 4);
-    std::vector<float> h(d.getLength());
-    d.getFeature(image.data(), 26, 26, h.data());
-    EXPECT_FLOAT_EQ(std::accumulate(h.begin(), h.end(), 0.0f), 23.0f * 23.0f);
-}
-
-TEST(LbpDescriptorCells, TooFewRowsGiveAnAllZeroHistogram)
-{
-    std::vector<float> image(24 * 2, 1.0f);
-    LbpDescriptor d(4, 4);
-    std::vector<float> h(d.getLength(), 9.0f);
-    d.getFeature(image.data(), 24, 2, h.data());
-    EXPECT_TRUE(std::all_of(h.begin(), h.end(), [](float v) { return v == 0.0f; }));
-}
-
-TEST(LbpDescriptorInput, RejectsBuffersAndSizesItCannotServe)
+TEST(LbpDescriptorInput, RejectsWhatItCannotServe)
 {
     LbpDescriptor d(4, 4);
-    std::vector<float> h(d.getLength());
-    std::vector<float> image(24 * 24, 0.0f);
+    EXPECT_THROW(d.init(-1, 4), qv_invalid_argument);
+    EXPECT_THROW(d.init(1 << 20, 1 << 20), qv_invalid_argument);
+    EXPECT_EQ(d.getLength(), 944); // unchanged by the refused calls
+    std::vector<float> h(d.getLength()), image(24 * 24, 0.0f);
     EXPECT_THROW(d.getFeature(image.data(), 24, 24, nullptr), qv_invalid_argument);
     EXPECT_THROW(d.getFeature(nullptr, 24, 24, h.data()), qv_invalid_argument);
     EXPECT_THROW(d.getFeature(image.data(), -24, 24, h.data()), qv_invalid_argument);
-    // Interior pixels but fewer columns than cells: no cell to put them in.
-    EXPECT_THROW(d.getFeature(image.data(), 3, 24, h.data()), qv_invalid_argument);
-    // No cells: nothing to write, even without buffers.
-    EXPECT_NO_THROW(LbpDescriptor().getFeature(nullptr, 24, 24, nullptr));
+    EXPECT_THROW(d.getFeature(image.data(), 3, 24, h.data()), qv_invalid_argument); // narrower than 4 cells
+    EXPECT_NO_THROW(LbpDescriptor().getFeature(nullptr, 24, 24, nullptr));         // no cells, nothing to write
 }
