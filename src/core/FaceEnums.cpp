@@ -1,28 +1,35 @@
 #include "core/FaceEnums.h"
 
+#include "core/Descramble.h"
 #include "core/Json.h"
+#include "core/RecordTexts.h"
 
 namespace {
 
-// Labels in order of value, starting at -1.
-const char* const kAgeIntervalLabels[] = {"ageIntervalNone", "ageInterval0", "ageInterval1",
-                                          "ageInterval2",    "ageInterval3", "ageInterval4"};
-const char* const kRaceLabels[] = {"raceNone", "race0", "race1", "race2", "race3"};
-const char* const kGenderLabels[] = {"genderNone", "gender0", "gender1"};
-const char* const kPoseLabels[] = {"poseNone", "pose0", "pose1", "pose2", "pose3", "pose4", "pose5", "pose6"};
+// Stored forms of the labels, in order of value from -1; restored at each use.
+const char* const kAgeIntervalLabels[] = {scrambled::kLabelAgeIntervalNone, scrambled::kLabelAgeInterval0,
+                                          scrambled::kLabelAgeInterval1,    scrambled::kLabelAgeInterval2,
+                                          scrambled::kLabelAgeInterval3,    scrambled::kLabelAgeInterval4};
+const char* const kRaceLabels[] = {scrambled::kLabelRaceNone, scrambled::kLabelRace0, scrambled::kLabelRace1,
+                                   scrambled::kLabelRace2, scrambled::kLabelRace3};
+const char* const kGenderLabels[] = {scrambled::kLabelGenderNone, scrambled::kLabelGender0,
+                                     scrambled::kLabelGender1};
+const char* const kPoseLabels[] = {scrambled::kLabelPoseNone, scrambled::kLabelPose0, scrambled::kLabelPose1,
+                                   scrambled::kLabelPose2,    scrambled::kLabelPose3, scrambled::kLabelPose4,
+                                   scrambled::kLabelPose5,    scrambled::kLabelPose6};
 
 template <std::size_t N>
 std::string labelOf(int32_t value, const char* const (&labels)[N]) {
     // Compare in 64 bits so that no value wraps into the range.
     int64_t index = static_cast<int64_t>(value) + 1;
     if (index < 0 || index >= static_cast<int64_t>(N)) throw JsonError(kJsonSerializationError);
-    return std::string("\"") + labels[index] + "\"";
+    return "\"" + descrambleText(labels[index]) + "\"";
 }
 
 template <std::size_t N>
 int32_t valueOf(const std::string& text, const char* const (&labels)[N]) {
     for (std::size_t i = 0; i < N; ++i) {
-        if (text == std::string("\"") + labels[i] + "\"") return static_cast<int32_t>(i) - 1;
+        if (text == "\"" + descrambleText(labels[i]) + "\"") return static_cast<int32_t>(i) - 1;
     }
     throw JsonError(kJsonDeserializationError);
 }

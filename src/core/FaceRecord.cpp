@@ -6,18 +6,20 @@
 
 #include "core/ApiError.h"
 #include "core/Descramble.h"
+#include "core/RecordTexts.h"
 #include "core/ScrambledTexts.h"
 
 namespace {
 
 enum class Attribute { Age, Gender, Race, AgeInterval, Pose, Unknown };
 
+// The names are stored scrambled and compared, in this order, with the whole name.
 Attribute attributeOf(const std::string& name) {
-    if (name == "attributeAge") return Attribute::Age;
-    if (name == "attributeGender") return Attribute::Gender;
-    if (name == "attributeRace") return Attribute::Race;
-    if (name == "attributeAgeInterval") return Attribute::AgeInterval;
-    if (name == "attributePose") return Attribute::Pose;
+    if (name == descrambleText(scrambled::kAttributeAge)) return Attribute::Age;
+    if (name == descrambleText(scrambled::kAttributeGender)) return Attribute::Gender;
+    if (name == descrambleText(scrambled::kAttributeRace)) return Attribute::Race;
+    if (name == descrambleText(scrambled::kAttributeAgeInterval)) return Attribute::AgeInterval;
+    if (name == descrambleText(scrambled::kAttributePose)) return Attribute::Pose;
     return Attribute::Unknown;
 }
 

@@ -25,8 +25,8 @@ public:
     const std::string& personName() const { return data_.personName(); }
     void setPersonName(const std::string& v) { data_.setPersonName(v); }
 
-    // Names: "attributeAge", "attributeGender", "attributeRace",
-    // "attributeAgeInterval", "attributePose". The age moves as a plain float
+    // Five names (stored scrambled, see core/RecordTexts.txt) reach age,
+    // gender, race, age interval and pose. The age moves as a plain float
     // text, the classes as their quoted labels. An unknown name or a failed
     // conversion raises ApiError.
     std::string attribute(const std::string& name) const;

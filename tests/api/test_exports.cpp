@@ -4,6 +4,8 @@
 #include <gtest/gtest.h>
 
 #include <cstdio>
+#include <fstream>
+#include <iterator>
 #include <set>
 #include <string>
 #include <vector>
@@ -57,6 +59,14 @@ TEST(SharedLibraryExports, InternalsStayHidden) {
         if (line.find("FaceDetectionApi::detect") != std::string::npos) apiExported = true;
     }
     EXPECT_TRUE(apiExported) << "FaceDetectionApi is part of the exported interface";
+}
+
+TEST(SharedLibraryExports, RecordLabelsAndAttributeNamesAreNotLegible) {
+    std::ifstream in(QUORIN_SHARED_LIBRARY, std::ios::binary);
+    const std::string bytes((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+    ASSERT_FALSE(bytes.empty());
+    for (const char* plain : {"ageIntervalNone", "raceNone", "genderNone", "poseNone", "attributeAgeInterval"})
+        EXPECT_EQ(bytes.find(plain), std::string::npos) << plain;
 }
 
 }  // namespace

@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <climits>
+#include <cstdlib>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -14,6 +15,8 @@
 #include "core/FaceRecord.h"
 #include "core/Json.h"
 #include "core/QVFace.h"
+#include "core/RecordTexts.h"
+#include "support/SourceTree.h"
 
 namespace {
 
@@ -165,6 +168,15 @@ TEST(FaceEnumerations, PoseMirrorsAndWildness) {
     EXPECT_TRUE(FacePose().wildPose());
     EXPECT_TRUE(FacePose::Compare()(FacePose(-1), FacePose(0)));
     EXPECT_FALSE(FacePose::Compare()(FacePose(2), FacePose(2)));
+}
+
+TEST(RecordTexts, StoredLabelsAreGeneratedFromTheirTable) {
+    EXPECT_EQ(FacePose(3).toJson(), "\"pose3\"");
+    EXPECT_EQ(FaceAgeInterval(-1).toJson(), "\"ageIntervalNone\"");
+    const std::string command = sourcetree::python() + " '" + sourcetree::path("tools/scramble_text.py") +
+                                "' --check --table '" + sourcetree::path("src/core/RecordTexts.txt") +
+                                "' --header '" + sourcetree::path("src/core/RecordTexts.h") + "'";
+    EXPECT_EQ(std::system(command.c_str()), 0) << "regenerate src/core/RecordTexts.h";
 }
 
 TEST(FaceRecordAttributes, FiveNamedFieldsRoundTripAndOthersRaiseApiError) {
