@@ -184,6 +184,14 @@ TEST(SvmModelLoad, RejectsInconsistentModels)
     EXPECT_THROW(broken([](SvmModelSpec& s) { s.svCounts = {2, 2}; }), qv_data_error);   // 4 of 3
     EXPECT_THROW(broken([](SvmModelSpec& s) { s.svCounts = {4, -1}; }), qv_data_error);
     EXPECT_THROW(broken([](SvmModelSpec& s) { s.supportVectors[2] = {1, 1, 1}; }), qv_data_error); // column 3
+    {   // Counts claiming two vectors while an entry sits in row 3.
+        postfilterwriters::ByteWriter w;
+        postfilterwriters::writeSvmModel(w, twoClassSpec(0));
+        std::vector<uint8_t> bytes = w.bytes();
+        for (int at : {40, 44, 48}) // svCounts {1, 1}, svTotal 2
+            bytes[at] = at == 48 ? 2 : 1;
+        EXPECT_THROW(load(bytes), qv_data_error);
+    }
 
     // A sparse table whose dense form would be 10^10 values, and a negative entry count.
     for (int32_t entries : {0, -1}) {
