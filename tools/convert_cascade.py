@@ -75,7 +75,7 @@ def load_xml(path):
     return feats, stages
 
 
-def convert(feats, stages, score_gain=1.0):
+def convert(feats, stages, score_gain=0.5):
     if score_gain <= 0 or np.log2(score_gain) != int(np.log2(score_gain)):
         raise ValueError('score gain must be a power of two')
     g = F32(score_gain)
@@ -105,7 +105,7 @@ def main(argv=None):
     ap.add_argument('--out', default=os.path.join(os.path.dirname(os.path.abspath(__file__)),
                                                   '..', 'models', 'mdcb.bin'),
                     help='payload to write (default: models/mdcb.bin)')
-    ap.add_argument('--score-gain', type=float, default=1.0,
+    ap.add_argument('--score-gain', type=float, default=0.5,
                     help='power of two multiplying the last stage, hence the reported score')
     args = ap.parse_args(argv)
     feats, stages = load_xml(args.xml)

@@ -1,0 +1,168 @@
+#!/usr/bin/python3
+"""Trains the built-in ILABS post filter (models/mdpb.bin) on hits mined by our own detector.
+
+Input: the hits written by tools/dump_hits (labels/hits.tsv and labels/hits.f32 in the data
+cache: per merged hit of the cascade, its 945-value feature and its best overlap with a
+teacher face) and the fixed split tools/data_split.json. Labels: a hit on a photo or clip
+frame of kind "face" is a true face when it overlaps a teacher face with IoU >= 0.4 and a
+false hit when below 0.1 (ambiguous ones are left out); every hit on a face-free image
+(negatives/) or on a photo of kind "nonface" (masks, helmets) is a false hit; artwork is
+left out. Only the "train" split is trained on; the figures are reported on "report".
+
+Model: a linear term on the standardised feature, fitted by L2-regularised logistic
+regression (Newton steps, class-balanced weights), then folded back onto the raw feature
+and quantised to the format's int16 blocks. The bias is set so that at least --keep of the
+training faces pass. All 15 categories carry the same model (a single-branch cascade only
+ever reports category 0). Deterministic: no randomness is involved.
+"""
+import argparse
+import json
+import os
+import sys
+
+import numpy as np
+
+sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
+import ilabs_feature as ilabs  # noqa: E402
+
+DIM = 945
+FAST_PASS = np.float32(6.0)
+HERE = os.path.dirname(os.path.abspath(__file__))
+
+
+def data_dir():
+    return os.environ.get('QUORIN_DATA_DIR', os.path.join(os.path.expanduser('~'), '.cache', 'quorin'))
+
+
+def split_of(image, split):
+    """(split, kind) of a cache-relative image path, or (None, None) when unknown."""
+    folder, _, rest = image.partition('/')
+    if folder == 'photos':
+        e = split['photos'].get(rest)
+        return (e['split'], e['kind']) if e else (None, None)
+    if folder == 'frames':
+        e = split['clips'].get(rest.split('/')[0])
+        return (e['split'], e['kind']) if e else (None, None)
+    if folder == 'negatives':
+        return split['negatives'].get(rest), 'free'
+    return None, None
+
+
+def load_hits(prefix, split):
+    rows = [line.rstrip('\n').split('\t') for line in open(prefix + '.tsv')]
+    feats = np.fromfile(prefix + '.f32', dtype='<f4')
+    if feats.size != len(rows) * DIM:
+        raise SystemExit('hits.tsv and hits.f32 disagree: run dump_hits again')
+    feats = feats.reshape(len(rows), DIM)
+    labels, sets, keep = [], [], []
+    for i, r in enumerate(rows):
+        which, kind = split_of(r[0], split)
+        best = float(r[3])
+        if which is None or kind == 'artwork':
+            continue
+        if kind in ('free', 'nonface'):
+            label = 0
+        elif best >= 0.4:
+            label = 1
+        elif best < 0.1:
+            label = 0
+        else:
+            continue
+        labels.append(label)
+        sets.append(which)
+        keep.append(i)
+    return feats[keep], np.array(labels), np.array(sets), [rows[i] for i in keep]
+
+
+def fit_logistic(x, y, l2, steps=30):
+    """Class-balanced L2 logistic regression by Newton steps; returns (w, b)."""
+    n, d = x.shape
+    xa = np.hstack([x, np.ones((n, 1))])
+    sw = np.where(y == 1, 0.5 / max(1, y.sum()), 0.5 / max(1, (1 - y).sum()))
+    reg = np.full(d + 1, l2)
+    reg[-1] = 0.0
+    theta = np.zeros(d + 1)
+    for _ in range(steps):
+        p = 1.0 / (1.0 + np.exp(-(xa @ theta)))
+        grad = xa.T @ (sw * (p - y)) + reg * theta
+        hess = (xa * (sw * p * (1 - p))[:, None]).T @ xa + np.diag(reg + 1e-12)
+        delta = np.linalg.solve(hess, grad)
+        theta -= delta
+        if np.max(np.abs(delta)) < 1e-10:
+            break
+    return theta[:-1], theta[-1]
+
+
+def decisions(category, feats):
+    """The library's decisions: fast pass on the score, else the category's sign."""
+    linear = category[0].astype(np.float64)
+    scores = feats.astype(np.float64) @ linear - float(category[4])
+    return (feats[:, 0] >= FAST_PASS) | (scores > 0), scores
+
+
+def main(argv=None):
+    ap = argparse.ArgumentParser(description=__doc__.splitlines()[0],
+                                 epilog='Defaults reproduce models/mdpb.bin from the mined hits.')
+    ap.add_argument('--hits', default=None, help='prefix of the dump_hits output (default: DATA/labels/hits)')
+    ap.add_argument('--split', default=os.path.join(HERE, 'data_split.json'))
+    ap.add_argument('--out', default=os.path.join(HERE, '..', 'models', 'mdpb.bin'))
+    ap.add_argument('--l2', type=float, default=100.0, help='ridge weight on the standardised feature')
+    ap.add_argument('--keep', type=float, default=0.999, help='share of training faces the bias keeps')
+    args = ap.parse_args(argv)
+
+    split = json.load(open(args.split))
+    feats, labels, sets, rows = load_hits(args.hits or os.path.join(data_dir(), 'labels', 'hits'), split)
+    train = sets == 'train'
+    if train.sum() == 0 or labels[train].min() == labels[train].max():
+        raise SystemExit('no usable training hits')
+
+    x = feats[train].astype(np.float64)
+    mu, sigma = x.mean(0), x.std(0)
+    sigma[sigma < 1e-6] = 1.0  # bins that never fire get no weight anyway
+    w, b = fit_logistic((x - mu) / sigma, labels[train].astype(np.float64), args.l2)
+    raw_w = w / sigma
+    margin = x @ raw_w + (b - mu @ raw_w)
+
+    # The bias: the largest that still keeps the wanted share of training faces
+    # that the fast pass doesn't already let through.
+    judged = labels[train] == 1
+    judged &= feats[train][:, 0] < FAST_PASS
+    pos_margin = np.sort(margin[judged])
+    cut = pos_margin[int(np.floor((1.0 - args.keep) * len(pos_margin)))] if len(pos_margin) else 0.0
+    shift = (b - mu @ raw_w) - cut + 1e-3  # faces at the cut stay strictly above 0
+
+    category = (raw_w, np.zeros(0), np.zeros((0, DIM)), np.zeros((0, DIM)), -shift)
+    payload = ilabs.write_ilabs([category] * ilabs.CATEGORY_NUMBER)
+    quantised = ilabs.read_ilabs(payload)[0]
+    with open(args.out, 'wb') as f:
+        f.write(payload)
+
+    print('%s: %d bytes, linear term only, l2 %g, training faces kept >= %.1f%%'
+          % (os.path.normpath(args.out), len(payload), args.l2, 100 * args.keep))
+    print('%-8s %8s %8s %12s %12s' % ('split', 'faces', 'false', 'faces kept', 'false removed'))
+    plain = np.array([r[1] == '-' for r in rows])
+    for name, m in (('train', sets == 'train'), ('report', sets == 'report'),
+                    ('report*', (sets == 'report') & plain)):
+        passed, _ = decisions(quantised, feats[m])
+        pos, neg = labels[m] == 1, labels[m] == 0
+        kept = passed[pos].mean() if pos.any() else float('nan')
+        removed = 1.0 - passed[neg].mean() if neg.any() else float('nan')
+        print('%-8s %8d %8d %11.1f%% %11.1f%%' % (name, pos.sum(), neg.sum(), 100 * kept, 100 * removed))
+    print('  (report*: the report split without mirrored and turned copies)')
+    # Where the report split's false hits come from, and those that pass.
+    m = sets == 'report'
+    passed, _ = decisions(quantised, feats[m])
+    origin = {}
+    for r, lab, ok in zip([rows[i] for i in np.flatnonzero(m)], labels[m], passed):
+        if lab == 0:
+            k = r[0].split('/')[0]
+            a = origin.setdefault(k, [0, 0])
+            a[0] += 1
+            a[1] += int(not ok)
+    for k, (n, gone) in sorted(origin.items()):
+        print('  report false hits on %-10s %4d, removed %4d' % (k, n, gone))
+    return 0
+
+
+if __name__ == '__main__':
+    sys.exit(main())
