@@ -11,6 +11,7 @@
 #include "api/FaceDetectionApi.h"
 #include "api/FaceDetectionPipeline.h"
 #include "core/ApiError.h"
+#include "core/Errors.h"
 #include "core/FaceModelPaths.h"
 #include "core/FaceModelPathsHandle.h"
 #include "support/ScriptedStages.h"
@@ -135,6 +136,32 @@ TEST(FaceDetectionApi, FailuresBelowBecomeItsOwnMessages) {
     EXPECT_EQ(messageOf([&] { api.setFaceSizeRange(1, 2); }), "QVFace Detection API set face size range error");
     stages.what = ThrowingStages::What::NonStd;
     EXPECT_THROW(api.detect(requestFor(pixels, 2)), int) << "what isn't a std::exception passes unchanged";
+}
+
+TEST(FaceDetectionApi, OversizedFrameFromTheRealDetectorBecomesItsDetectError) {
+    // Real engines, with a bound below the frame: the work frame of the
+    // thorough mode keeps a 320-pixel frame as it is.
+    const char* const small =
+        R"({"faceRects":{"detector":{"model":"mdcb","imageMaxSize":200,"faceMinSize":24,"faceMaxSize":200},)"
+        R"("postfilter":{"name":"ILABS_POSTFILTER","param":{"model":"mdpb"}}},"faceParts":{"neuralNetModelPath":"mdnb"}})";
+    std::vector<unsigned char> pixels(320 * 320, 128);
+    FaceDetectionPipeline pipeline;
+    pipeline.init(pathsWithDetection(small));
+    ASSERT_TRUE(pipeline.ready());
+    try {
+        pipeline.detect(requestFor(pixels, 320));
+        FAIL() << "a frame above imageMaxSize was searched";
+    } catch (const qv_data_error& e) {
+        EXPECT_STREQ(e.what(), "Image is larger than the maximum supported size");
+    }
+    EXPECT_NO_THROW(pipeline.detect(requestFor(pixels, 200)));
+
+    FaceDetectionApi api;
+    FaceModelPathsHandle handle;
+    handle.fromJson(pathsWithDetection(small).toJson());
+    api.init(handle);
+    EXPECT_EQ(messageOf([&] { api.detect(requestFor(pixels, 320)); }), "QVFace Detection API detect error");
+    EXPECT_NO_THROW(api.detect(requestFor(pixels, 200))) << "the session survives the refused frame";
 }
 
 }  // namespace
