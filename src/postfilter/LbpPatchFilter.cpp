@@ -7,6 +7,26 @@
 #include "image/Image.h"
 #include "image/IntegralImage.h"
 
+namespace {
+
+// The buffers one hit's feature is made in, reused over the hits of a frame.
+struct Scratch {
+    explicit Scratch(int featureLength)
+        : patch(LbpPatchFilter::SCALED_FACE_SIZE, LbpPatchFilter::SCALED_FACE_SIZE, LbpPatchFilter::SCALED_FACE_SIZE,
+                nullptr),
+          pixels(LbpPatchFilter::SCALED_FACE_SIZE * LbpPatchFilter::SCALED_FACE_SIZE),
+          values(static_cast<size_t>(featureLength))
+    {
+        if (patch.data == nullptr)
+            throw qv_operation_error("PostFilter patch allocation failed");
+    }
+    IMAGE patch;
+    std::vector<float> pixels;
+    std::vector<float> values;
+};
+
+} // namespace
+
 LbpPatchFilter::LbpPatchFilter(bool transposedPatch)
     : transposed(transposedPatch), descriptor(LBP_CELL_NUMBER, LBP_CELL_NUMBER)
 {
@@ -46,14 +66,9 @@ void LbpPatchFilter::extract(IN_IMAGE const& image, ScoredWindow const& hit, IMA
 
 std::vector<float> LbpPatchFilter::feature(IN_IMAGE const& image, ScoredWindow const& hit) const
 {
-    const int size = SCALED_FACE_SIZE;
-    IMAGE patch(size, size, size, nullptr);
-    if (patch.data == nullptr)
-        throw qv_operation_error("PostFilter patch allocation failed");
-    std::vector<float> pixels(size * size);
-    std::vector<float> out(descriptor.getLength() + 1);
-    extract(image, hit, patch, pixels.data(), out.data());
-    return out;
+    Scratch scratch(descriptor.getLength() + 1);
+    extract(image, hit, scratch.patch, scratch.pixels.data(), scratch.values.data());
+    return scratch.values;
 }
 
 void LbpPatchFilter::filter(IN_IMAGE const& image, std::vector<ScoredWindow> const& input,
@@ -63,17 +78,11 @@ void LbpPatchFilter::filter(IN_IMAGE const& image, std::vector<ScoredWindow> con
         throw qv_invalid_argument("PostFilter output is null");
     if (input.empty())
         return;
-    const int size = SCALED_FACE_SIZE;
-    IMAGE patch(size, size, size, nullptr);
-    if (patch.data == nullptr)
-        throw qv_operation_error("PostFilter patch allocation failed");
-    std::vector<float> pixels(size * size);
-    std::vector<float> values(descriptor.getLength() + 1);
-
+    Scratch scratch(descriptor.getLength() + 1);
     for (const ScoredWindow& hit : input) {
         if (!passesUnjudged(hit)) {
-            extract(image, hit, patch, pixels.data(), values.data());
-            if (!judge(hit, values.data(), static_cast<int>(values.size())))
+            extract(image, hit, scratch.patch, scratch.pixels.data(), scratch.values.data());
+            if (!judge(hit, scratch.values.data(), static_cast<int>(scratch.values.size())))
                 continue;
         }
         output->push_back(hit);

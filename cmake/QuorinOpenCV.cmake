@@ -1,0 +1,30 @@
+# quorin_find_opencv(): sets QUORIN_OPENCV_FOUND, QUORIN_OPENCV_INCLUDES and
+# QUORIN_OPENCV_LIBS for the modules the comparison and the cascade check use.
+# OpenCV is only ever a test and benchmark reference, never a library
+# dependency.
+function(quorin_find_opencv)
+  find_package(OpenCV QUIET COMPONENTS core imgproc imgcodecs objdetect)
+  if(OpenCV_FOUND)
+    set(QUORIN_OPENCV_FOUND TRUE PARENT_SCOPE)
+    set(QUORIN_OPENCV_INCLUDES ${OpenCV_INCLUDE_DIRS} PARENT_SCOPE)
+    set(QUORIN_OPENCV_LIBS opencv_core opencv_imgproc opencv_imgcodecs opencv_objdetect PARENT_SCOPE)
+    return()
+  endif()
+  # Debian's per-module -dev packages ship no CMake package files.
+  find_path(QUORIN_OPENCV_INCLUDE opencv2/objdetect.hpp PATH_SUFFIXES opencv4)
+  set(libs "")
+  set(found TRUE)
+  if(NOT QUORIN_OPENCV_INCLUDE)
+    set(found FALSE)
+  endif()
+  foreach(m core imgproc imgcodecs objdetect)
+    find_library(QUORIN_OPENCV_${m} opencv_${m})
+    if(NOT QUORIN_OPENCV_${m})
+      set(found FALSE)
+    endif()
+    list(APPEND libs ${QUORIN_OPENCV_${m}})
+  endforeach()
+  set(QUORIN_OPENCV_FOUND ${found} PARENT_SCOPE)
+  set(QUORIN_OPENCV_INCLUDES ${QUORIN_OPENCV_INCLUDE} PARENT_SCOPE)
+  set(QUORIN_OPENCV_LIBS ${libs} PARENT_SCOPE)
+endfunction()
