@@ -137,4 +137,54 @@ TEST_F(RealPhotos, RepeatedCallsGiveTheSameFaces) {
     EXPECT_FALSE(first.boxes.empty());
 }
 
+struct Points {
+    const char* photo;
+    int face;           // index into that photo's expected faces
+    int xy[5][2];       // leftEye, rightEye, nose, leftMouthCorner, rightMouthCorner
+};
+
+// The teacher's five points (dlib's 68-point model reduced: eye contour means,
+// nose tip, outer mouth corners; "left" on the image's left).
+const std::vector<Points> kPoints = {
+    {"tracking_faces.jpg", 0, {{73, 121}, {112, 121}, {96, 135}, {76, 163}, {109, 163}}},
+    {"tracking_faces.jpg", 1, {{252, 173}, {294, 169}, {274, 198}, {259, 217}, {295, 212}}},
+    {"tracking_faces.jpg", 2, {{482, 95}, {520, 97}, {500, 117}, {482, 135}, {515, 136}}},
+    {"SeanConnery.jpg", 0, {{146, 148}, {211, 141}, {181, 184}, {155, 218}, {215, 213}}},
+    {"cage.jpg", 0, {{168, 267}, {297, 252}, {238, 354}, {194, 428}, {304, 414}}},
+    {"clmtrackr01.jpg", 0, {{130, 132}, {188, 123}, {166, 157}, {132, 193}, {194, 185}}},
+    {"franck_02045.jpg", 0, {{363, 276}, {475, 260}, {431, 325}, {387, 414}, {477, 402}}},
+};
+
+TEST_F(RealPhotos, LandmarksLieNearTheTeacherPoints) {
+    // Block offsets of the five points, in the teacher's order.
+    const int offsets[5] = {7, 9, 15, 11, 13};
+    double sum = 0.0;
+    for (const Points& p : kPoints) {
+        SCOPED_TRACE(p.photo);
+        const auto photo = std::find_if(kPhotos.begin(), kPhotos.end(),
+                                        [&](const Photo& x) { return std::string(x.name) == p.photo; });
+        ASSERT_NE(photo, kPhotos.end());
+        const Detection d = detectPhoto(devdata::photo(p.photo));
+        const int k = matchFaces(photo->faces, d.boxes)[static_cast<size_t>(p.face)];
+        ASSERT_GE(k, 0);
+        const int* b = &d.blocks[static_cast<size_t>(k) * kBlockInts];
+        const double iod = std::hypot(p.xy[1][0] - p.xy[0][0], p.xy[1][1] - p.xy[0][1]);
+        double err = 0.0;
+        for (int i = 0; i < 5; ++i) {
+            const double e = std::hypot(b[offsets[i]] - p.xy[i][0], b[offsets[i] + 1] - p.xy[i][1]) / iod;
+            EXPECT_LT(e, 0.5) << "point " << i;
+            err += e / 5.0;
+        }
+        EXPECT_LT(err, 0.3);
+        // Image-left parts come first, the eyes above the nose above the mouth.
+        EXPECT_LT(b[7], b[9]);
+        EXPECT_LT(b[11], b[13]);
+        EXPECT_LT(std::max(b[8], b[10]), b[16]);
+        EXPECT_LT(b[16], std::min(b[12], b[14]));
+        std::printf("%-20s face %d: mean point error %.3f of the eye distance\n", p.photo, p.face, err);
+        sum += err;
+    }
+    RecordProperty("mean_normalised_point_error", std::to_string(sum / kPoints.size()));
+}
+
 }  // namespace
