@@ -8,15 +8,20 @@
 // smallest and largest face size our engine derives for the frame, on one
 // thread like ours. Prints a table: median ms per frame each, the ratio, faces
 // found by each and how many of ours overlap one of OpenCV's (IoU >= 0.3).
+// Given the teacher labels (one JSON line per image with face rectangles), it
+// also counts for the photos how many labelled faces each finds (IoU >= 0.4,
+// one box per face), so that speed is read beside recall.
 // Deterministic apart from the timings.
 
 #include <algorithm>
+#include <array>
 #include <chrono>
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
+#include <map>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -43,6 +48,7 @@ struct Args {
   std::vector<int> sizes = {320, 640, 1280};
   int repeats = 3;
   int cvThreads = 1;
+  std::string labelsPath;
   std::string videoPath;
   int videoWidth = 0, videoHeight = 0;
   int videoFrames = 300;
@@ -59,15 +65,16 @@ void usage(std::FILE* to) {
       "  --video RAW         raw 8-bit gray frames for the tracking-mode row\n"
       "  --video-size WxH    size of those frames\n"
       "  --video-frames N    use at most N frames (default 300)\n"
-      "  --cv-threads N      OpenCV threads (default 1; our engine uses one)\n"
+      "  --cv-threads N      OpenCV threads (default 1, as our engine uses one; 0 keeps OpenCV's own default)\n"
+      "  --labels JSONL      teacher labels: adds recall columns for the photos\n"
       "  -h, --help          this text\n",
       to);
 }
 
-int toInt(const std::string& s, const char* what) {
+int toInt(const std::string& s, const char* what, long lowest = 1) {
   char* end = nullptr;
   long v = std::strtol(s.c_str(), &end, 10);
-  if (s.empty() || *end != '\0' || v < 1 || v > 100000) throw std::invalid_argument(std::string("bad ") + what + ": " + s);
+  if (s.empty() || *end != '\0' || v < lowest || v > 100000) throw std::invalid_argument(std::string("bad ") + what + ": " + s);
   return static_cast<int>(v);
 }
 
@@ -97,7 +104,9 @@ Args parseArgs(int argc, char** argv) {
     } else if (s == "--repeats") {
       a.repeats = toInt(value(), "repeat count");
     } else if (s == "--cv-threads") {
-      a.cvThreads = toInt(value(), "thread count");
+      a.cvThreads = toInt(value(), "thread count", 0);
+    } else if (s == "--labels") {
+      a.labelsPath = value();
     } else if (s == "--video") {
       a.videoPath = value();
     } else if (s == "--video-size") {
@@ -201,6 +210,73 @@ int matched(const std::vector<Box>& ours, const std::vector<Box>& theirs) {
   return count;
 }
 
+// Teacher rectangles by image file name (without folders), in the labelled
+// image's pixels. Lines that don't parse are skipped: the labels only add
+// columns, they never stop the timing.
+using Labels = std::map<std::string, std::vector<std::array<double, 4>>>;
+
+Labels readLabels(const std::string& path) {
+  std::ifstream in(path);
+  if (!in) throw std::runtime_error("cannot open labels " + path);
+  Labels labels;
+  std::string line;
+  while (std::getline(in, line)) {
+    const std::string key = "\"image\":\"";
+    std::size_t p = line.find(key);
+    if (p == std::string::npos) continue;
+    p += key.size();
+    const std::size_t q = line.find('"', p);
+    if (q == std::string::npos) continue;
+    std::string name = line.substr(p, q - p);
+    const std::size_t slash = name.rfind('/');
+    if (slash != std::string::npos) name = name.substr(slash + 1);
+    std::vector<std::array<double, 4>> rects;
+    bool ok = true;
+    for (std::size_t r = line.find("\"rect\":[", q); ok && r != std::string::npos; r = line.find("\"rect\":[", r)) {
+      const char* c = line.c_str() + r + 8;
+      std::array<double, 4> v{};
+      for (int k = 0; k < 4 && ok; ++k) {
+        char* end = nullptr;
+        v[static_cast<std::size_t>(k)] = std::strtod(c, &end);
+        ok = end != c && (*end == (k < 3 ? ',' : ']'));
+        c = end + 1;
+      }
+      if (ok) rects.push_back(v);
+      r += 8;
+    }
+    if (ok) labels[name] = std::move(rects);
+  }
+  return labels;
+}
+
+std::string baseName(const std::string& path) {
+  const std::size_t slash = path.rfind('/');
+  return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+// Labelled faces found: one box per face, greedily by best overlap, IoU >= 0.4.
+int labelledFound(const std::vector<Box>& truth, const std::vector<Box>& found) {
+  struct Pair {
+    double v;
+    std::size_t t, f;
+  };
+  std::vector<Pair> pairs;
+  for (std::size_t t = 0; t < truth.size(); ++t)
+    for (std::size_t f = 0; f < found.size(); ++f) {
+      const double v = iou(truth[t], found[f]);
+      if (v >= 0.4) pairs.push_back({v, t, f});
+    }
+  std::stable_sort(pairs.begin(), pairs.end(), [](const Pair& a, const Pair& b) { return a.v > b.v; });
+  std::vector<bool> usedT(truth.size(), false), usedF(found.size(), false);
+  int n = 0;
+  for (const Pair& p : pairs)
+    if (!usedT[p.t] && !usedF[p.f]) {
+      usedT[p.t] = usedF[p.f] = true;
+      ++n;
+    }
+  return n;
+}
+
 double median(std::vector<double> v) {
   if (v.empty()) return 0.0;
   std::sort(v.begin(), v.end());
@@ -213,12 +289,19 @@ struct Row {
   std::size_t frames = 0;
   std::vector<double> oursMs, cvMs;
   long oursFaces = 0, cvFaces = 0, both = 0;
+  long labelled = -1, oursLabelled = 0, cvLabelled = 0;  // -1: no labels for this row
 };
 
 void printRow(const Row& r) {
   const double o = median(r.oursMs), c = median(r.cvMs);
-  std::printf("%-26s %7zu %10.2f %11.2f %7.1fx %11ld %13ld %8ld\n", r.name.c_str(), r.frames, o, c,
+  std::printf("%-26s %7zu %10.2f %11.2f %7.1fx %11ld %13ld %8ld", r.name.c_str(), r.frames, o, c,
               o > 0 ? c / o : 0.0, r.oursFaces, r.cvFaces, r.both);
+  if (r.labelled > 0)
+    std::printf(" %9ld %11.1f%% %12.1f%%", r.labelled, 100.0 * r.oursLabelled / r.labelled,
+                100.0 * r.cvLabelled / r.labelled);
+  else if (r.labelled == 0)
+    std::printf(" %9d %12s %13s", 0, "-", "-");
+  std::printf("\n");
   std::fflush(stdout);
 }
 
@@ -242,13 +325,14 @@ int main(int argc, char** argv) {
     usage(stderr);
     return 2;
   }
-  cv::setNumThreads(args.cvThreads);
+  if (args.cvThreads > 0) cv::setNumThreads(args.cvThreads);
   cv::CascadeClassifier cascade;
   if (!cascade.load(args.cascade)) {
     std::fprintf(stderr, "quorin-compare-opencv: cannot load cascade %s\n", args.cascade.c_str());
     return 1;
   }
   std::vector<cv::Mat> photos;
+  std::vector<std::string> photoNames;
   for (const std::string& p : args.photos) {
     cv::Mat g = cv::imread(p, cv::IMREAD_GRAYSCALE);
     if (g.empty()) {
@@ -256,7 +340,18 @@ int main(int argc, char** argv) {
       continue;
     }
     photos.push_back(g);
+    photoNames.push_back(baseName(p));
   }
+  Labels labels;
+  if (!args.labelsPath.empty()) {
+    try {
+      labels = readLabels(args.labelsPath);
+    } catch (const std::exception& e) {
+      std::fprintf(stderr, "quorin-compare-opencv: %s\n", e.what());
+      return 1;
+    }
+  }
+  const bool withLabels = !args.labelsPath.empty();
 
   try {
     quorin_init();
@@ -265,8 +360,10 @@ int main(int argc, char** argv) {
     return 3;
   }
 
-  std::printf("%-26s %7s %10s %11s %8s %11s %13s %8s\n", "frames", "count", "ours ms", "opencv ms", "ratio",
+  std::printf("%-26s %7s %10s %11s %8s %11s %13s %8s", "frames", "count", "ours ms", "opencv ms", "ratio",
               "ours faces", "opencv faces", "matched");
+  if (withLabels) std::printf(" %9s %12s %13s", "labelled", "ours recall", "opencv recall");
+  std::printf("\n");
   std::vector<unsigned char> work;
   int status = 0;
   try {
@@ -275,7 +372,9 @@ int main(int argc, char** argv) {
       for (int side : args.sizes) {
         Row row;
         row.name = "photos " + std::to_string(side) + " (mode 2)";
-        for (const cv::Mat& photo : photos) {
+        if (withLabels) row.labelled = 0;
+        for (std::size_t k = 0; k < photos.size(); ++k) {
+          const cv::Mat& photo = photos[k];
           cv::Mat frame = resizedLongSide(photo, side);
           double best = 1e300, bestCv = 1e300, ms = 0;
           std::vector<Box> ours, theirs;
@@ -291,6 +390,18 @@ int main(int argc, char** argv) {
           row.cvFaces += static_cast<long>(theirs.size());
           row.both += matched(ours, theirs);
           ++row.frames;
+          const auto found = labels.find(photoNames[k]);
+          if (found != labels.end()) {
+            const double fx = static_cast<double>(frame.cols) / photo.cols;
+            const double fy = static_cast<double>(frame.rows) / photo.rows;
+            std::vector<Box> truth;
+            for (const auto& r : found->second)
+              truth.push_back({static_cast<int>(std::lround(r[0] * fx)), static_cast<int>(std::lround(r[1] * fy)),
+                               static_cast<int>(std::lround(r[2] * fx)), static_cast<int>(std::lround(r[3] * fy))});
+            row.labelled += static_cast<long>(truth.size());
+            row.oursLabelled += labelledFound(truth, ours);
+            row.cvLabelled += labelledFound(truth, theirs);
+          }
         }
         printRow(row);
       }
@@ -329,5 +440,14 @@ int main(int argc, char** argv) {
     status = 1;
   }
   quorin_release();
+  std::printf(
+      "\nours: libquorinapi through its C API, the whole pipeline (search, merge, post filter, landmarks);\n"
+      "  it shrinks each frame to its work size first (long side <= 640 in mode 2, <= 320 in mode 1).\n"
+      "opencv: CascadeClassifier::detectMultiScale on the frame as given, same frontal cascade,\n"
+      "  scaleFactor 1.25, minNeighbors 3, minSize = the smallest face our engine searches there; %d thread%s%s.\n"
+      "photos: per photo the fastest of %d runs each, median over photos; video: every frame once, median.\n"
+      "matched: our faces overlapping one of OpenCV's (IoU >= 0.3)%s.\n",
+      cv::getNumThreads(), cv::getNumThreads() == 1 ? "" : "s", args.cvThreads == 0 ? " (OpenCV's default)" : "",
+      args.repeats, withLabels ? "; recall: labelled faces found, IoU >= 0.4" : "");
   return status;
 }

@@ -2,8 +2,10 @@
 # Times our engine against OpenCV's CascadeClassifier in one run on the same
 # frames: the development photos (resized to 320, 640 and 1280 long side) and a
 # face clip decoded to gray frames for the tracking-mode row. Builds the
-# comparison program (Release) in build-compare/, prints the table and keeps a
-# copy in out/compare.txt.
+# comparison program (Release) in build-compare/, prints the table with OpenCV
+# on one thread (as our engine runs) and again with OpenCV's default thread
+# count, adds recall against the teacher labels when they are there, and keeps
+# a copy in out/compare.txt.
 #
 #   bash bench/compare/run_compare.sh               clip franck, 300 frames
 #   CLIP=cap12_edit FRAMES=200 bash bench/compare/run_compare.sh
@@ -37,5 +39,12 @@ fi
 mkdir -p "$ROOT/out"
 shopt -s nullglob
 photos=("$CACHE"/photos/*.jpg "$CACHE"/photos/*.png)
-"$PROG" --repeats "$REPEATS" --video "$raw" --video-size "$size" --video-frames "$FRAMES" "${photos[@]}" \
-  | tee "$ROOT/out/compare.txt"
+labels=()
+[ -s "$CACHE/labels/faces.jsonl" ] && labels=(--labels "$CACHE/labels/faces.jsonl")
+{
+  for threads in 1 0; do
+    "$PROG" --repeats "$REPEATS" --cv-threads "$threads" "${labels[@]}" \
+      --video "$raw" --video-size "$size" --video-frames "$FRAMES" "${photos[@]}"
+    echo
+  done
+} | tee "$ROOT/out/compare.txt"
