@@ -125,6 +125,9 @@ Args parseArgs(int argc, char** argv) {
   }
   if (!a.videoPath.empty() && (a.videoWidth == 0 || a.videoHeight == 0))
     throw std::invalid_argument("--video needs --video-size");
+  // A mistyped size would otherwise reserve gigabytes for a frame the file can't fill.
+  if (static_cast<long long>(a.videoWidth) * a.videoHeight > 8192LL * 8192LL)
+    throw std::invalid_argument("--video-size is larger than 8192x8192 pixels");
   if (a.photos.empty() && a.videoPath.empty()) throw std::invalid_argument("no photos and no video given");
   return a;
 }
