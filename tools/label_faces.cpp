@@ -43,7 +43,7 @@ namespace {
 
 const char* kUsage =
     "usage: label_faces [--data DIR] [--out FILE] [--predictor FILE] [--upsample N]\n"
-    "                   [--only SUBSTRING]\n"
+    "                   [--only SUBSTRING] [--shard K/N]\n"
     "Labels faces and 68 landmarks in the development data with dlib (HOG detector).\n"
     "  --data DIR        data cache (default $QUORIN_DATA_DIR or ~/.cache/quorin)\n"
     "  --out FILE        JSON lines output (default DIR/labels/faces.jsonl)\n"
@@ -51,7 +51,9 @@ const char* kUsage =
     "                    /usr/share/dlib/shape_predictor_68_face_landmarks.dat)\n"
     "  --upsample N      doublings of images whose longer side is at most 1024 (default 1),\n"
     "                    so that faces down to about 40 pixels are found\n"
-    "  --only SUBSTRING  label only images whose relative path contains SUBSTRING\n";
+    "  --only SUBSTRING  label only images whose relative path contains SUBSTRING\n"
+    "  --shard K/N       label only the K-th of every N images in name order (0 <= K < N), so\n"
+    "                    that N processes can share a large set; concatenate their outputs\n";
 
 bool isImage(fs::path const& p) {
     std::string e = p.extension().string();
@@ -87,7 +89,7 @@ std::string jsonString(std::string const& s) {
 int main(int argc, char** argv) {
     std::string data, out, only;
     std::string predictorPath = "/usr/share/dlib/shape_predictor_68_face_landmarks.dat";
-    int upsample = 1;
+    int upsample = 1, shardK = 0, shardN = 1;
     if (char const* env = std::getenv("QUORIN_DATA_DIR")) data = env;
     else if (char const* home = std::getenv("HOME")) data = std::string(home) + "/.cache/quorin";
     for (int i = 1; i < argc; ++i) {
@@ -101,7 +103,12 @@ int main(int argc, char** argv) {
         else if (a == "--out") value(out);
         else if (a == "--predictor") value(predictorPath);
         else if (a == "--only") value(only);
-        else if (a == "--upsample") {
+        else if (a == "--shard") {
+            std::string v; value(v);
+            if (std::sscanf(v.c_str(), "%d/%d", &shardK, &shardN) != 2 || shardN < 1 || shardK < 0 || shardK >= shardN) {
+                std::cerr << "--shard needs K/N with 0 <= K < N\n"; return 2;
+            }
+        } else if (a == "--upsample") {
             std::string v; value(v);
             upsample = std::atoi(v.c_str());
             if (upsample < 0 || upsample > 2) { std::cerr << "--upsample must be 0, 1 or 2\n"; return 2; }
@@ -126,9 +133,10 @@ int main(int argc, char** argv) {
     std::string tmp = out + ".tmp";
     std::ofstream os(tmp);
     if (!os) { std::cerr << "cannot write " << tmp << "\n"; return 1; }
-    size_t images = 0, faces = 0;
+    size_t images = 0, faces = 0, index = 0;
     for (std::string const& rel : listImages(data)) {
         if (!only.empty() && rel.find(only) == std::string::npos) continue;
+        if (index++ % static_cast<size_t>(shardN) != static_cast<size_t>(shardK)) continue;
         int w = 0, h = 0, n = 0;
         unsigned char* px = stbi_load((fs::path(data) / rel).c_str(), &w, &h, &n, 1);
         if (!px) { std::cerr << "skipping unreadable " << rel << "\n"; continue; }
