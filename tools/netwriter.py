@@ -19,6 +19,8 @@ import random
 import struct
 import sys
 
+import numpy as np
+
 TXF_LINEAR, TXF_SIGMOID, TXF_SOFTMAX, TXF_ABS, TXF_SOFTMAX_PAIR = 0, 1, 4, 10, 11
 
 # Relative landmark positions in a detector rectangle (x, y), part order:
@@ -297,6 +299,44 @@ def reference_run(net, inputs):
     if n == 1 and net.transfer_types[L - 1] == TXF_SOFTMAX:
         n = 2
     return work[last:last + n], best[0]
+
+
+def _trunc_div(a, b):
+    """C division of int64 arrays: truncates toward zero."""
+    q = np.abs(a) // np.abs(b)
+    return np.where((a >= 0) == (b > 0), q, -q)
+
+
+def sigmoid16_batch(x):
+    a = np.abs(x)
+    t = a * 256 // 9
+    i = np.minimum(t >> 16, 255)
+    f = (t >> 8) & 255
+    table = np.array(_TABLE, np.int64)
+    r = (table[i + 1] * f + table[i] * (256 - f)) >> 8
+    r = np.where(x >= 0, r, 0x10000 - r)
+    return np.where(a >= 0x90000, np.where(x < 0, 0, 0x10000), r)
+
+
+def dense_run_batch(net, inputs):
+    """reference_run for many input rows at once, for nets made by quantise_mlp
+    (version > 10, dense layers, sigmoid or linear, no accumulator that can wrap,
+    which the quantiser guarantees). Callers check a few rows against
+    reference_run, which stays the definition."""
+    x = np.asarray(inputs, np.int64)
+    num = x * 65535 - np.array(net.input_offsets, np.int64)
+    q = _trunc_div(num, np.array(net.input_divisors, np.int64))
+    act = np.where((q < -65534) | (q > 65535), 65535, q)
+    for l in range(1, len(net.layer_sizes)):
+        n, src = net.layer_sizes[l], net.layer_sizes[l - 1]
+        w = np.zeros((src, n), np.int64)
+        for a in range(src):
+            (first, weights), = net.spans[l][a]
+            w[a, first - net.layer_start(l):first - net.layer_start(l) + len(weights)] = weights
+        acc = act @ w + (np.array(net.biases[l], np.int64) if net.biases[l] else 0)
+        v = _trunc_div(acc, np.int64(net.divisors[l] or 1))
+        act = sigmoid16_batch(v) if net.transfer_types[l] == TXF_SIGMOID else v
+    return act
 
 
 # ---- quantisation of a float MLP ---------------------------------------------

@@ -20,6 +20,7 @@ reference integer forward pass, i.e. bit for bit what the library computes.
 Deterministic: fixed seeds, one thread.
 """
 import argparse
+import hashlib
 import json
 import math
 import os
@@ -74,30 +75,6 @@ def patch_input(frame, box, side):
     return np.trunc(patch * gain).ravel()
 
 
-def load_samples(data, split):
-    faces = {}
-    for line in open(os.path.join(data, 'labels', 'faces.jsonl')):
-        e = json.loads(line)
-        faces[e['image']] = e['faces']
-    samples = []
-    for line in open(os.path.join(data, 'labels', 'hits.tsv')):
-        img, variant, long_side, best, _score, l, t, r, b = line.rstrip('\n').split('\t')
-        if variant != '-' or float(best) < 0.4:
-            continue
-        which, kind = tp.split_of(img, split)
-        if which is None or kind != 'face':
-            continue
-        box = np.array([float(l), float(t), float(r), float(b)])
-        refs = faces.get(img, [])
-        if not refs:
-            continue
-        ious = [tp_iou(box, f['rect']) for f in refs]
-        ref = refs[int(np.argmax(ious))]
-        samples.append({'image': img, 'long': int(long_side), 'box': box, 'pts': five_points(ref['points']),
-                        'split': which})
-    return samples
-
-
 def identity_of(image, split):
     folder, _, rest = image.partition('/')
     if folder == 'photos':
@@ -115,21 +92,21 @@ def tp_iou(a, b):
 
 
 class Frames:
-    """Work frames by (image, long side), decoded once."""
+    """Work frames by (folder, image, long side), decoded once."""
 
-    def __init__(self, data):
-        self.data, self.cache = data, {}
+    def __init__(self):
+        self.cache = {}
 
-    def get(self, image, long_side):
-        key = (image, long_side)
+    def get(self, root, image, long_side):
+        key = (root, image, long_side)
         if key not in self.cache:
-            gray = cv2.imread(os.path.join(self.data, image), cv2.IMREAD_GRAYSCALE)
+            gray = cv2.imread(os.path.join(root, image), cv2.IMREAD_GRAYSCALE)
             self.cache[key] = shrink(gray, long_side)
         return self.cache[key]
 
 
 def plain_example(frames, s, side):
-    frame, scale = frames.get(s['image'], s['long'])
+    frame, scale = frames.get(s['root'], s['image'], s['long'])
     box = np.round(s['box'] * scale).astype(int)
     box[[0, 1]] = np.maximum(box[[0, 1]], 0)
     box[2] = min(box[2], frame.shape[1])
@@ -138,21 +115,125 @@ def plain_example(frames, s, side):
     return patch_input(frame, box, side), box, pts
 
 
+def person_of(image):
+    """The identity of a many-identity photo: the LFW folder or the Congress id."""
+    parts = image.split('/')
+    return parts[2] if parts[1] == 'lfw' else os.path.splitext(parts[2])[0]
+
+
+def report_person(person, share=15):
+    """Fixed by-identity split: about share% of the people, by a hash of the name."""
+    return int(hashlib.sha256(person.encode()).hexdigest()[:8], 16) % 100 < share
+
+
+def read_five_points(path):
+    """Human-placed five points by cache-relative image path (photos/lfw/...)."""
+    out = {}
+    if not path or not os.path.exists(path):
+        return out
+    for line in open(path).readlines()[1:]:
+        f = line.rstrip('\n').split('\t')
+        out['photos/' + f[0]] = np.array([float(v) for v in f[1:11]]).reshape(5, 2)
+    return out
+
+
+def read_faces(data):
+    faces = {}
+    for line in open(os.path.join(data, 'labels', 'faces.jsonl')):
+        e = json.loads(line)
+        faces[e['image']] = e['faces']
+    return faces
+
+
+def plain_hits(data):
+    """Merged hits on unturned, unmirrored frames, one per image and box."""
+    seen, out = set(), []
+    for line in open(os.path.join(data, 'labels', 'hits.tsv')):
+        img, variant, long_side, best, _score, l, t, r, b = line.rstrip('\n').split('\t')
+        if variant != '-' or float(best) < 0.4:
+            continue
+        key = (img, l, t, r, b)
+        if key not in seen:
+            seen.add(key)
+            out.append((img, int(long_side), float(best), np.array([float(l), float(t), float(r), float(b)])))
+    return out
+
+
+def load_dev_samples(data, split):
+    faces = read_faces(data)
+    samples = []
+    for img, long_side, _best, box in plain_hits(data):
+        which, kind = tp.split_of(img, split)
+        if which is None or kind != 'face' or not faces.get(img):
+            continue
+        refs = faces[img]
+        ref = refs[int(np.argmax([tp_iou(box, f['rect']) for f in refs]))]
+        samples.append({'root': data, 'image': img, 'long': long_side, 'box': box, 'pts': five_points(ref['points']),
+                        'split': which, 'who': 'dev:' + identity_of(img, split), 'human': False,
+                        'source': 'dev'})
+    return samples
+
+
+def load_face_samples(faces_dir, human, sources):
+    """Samples of the many-identity folder. The person of a photo is the face nearest
+    its centre; that face takes the human points where they exist."""
+    faces = read_faces(faces_dir)
+    by_image = {}
+    for img, long_side, _best, box in plain_hits(faces_dir):
+        if img.split('/')[1] in sources and faces.get(img):
+            by_image.setdefault(img, []).append((long_side, box))
+    samples, offsets = [], []
+    for img in sorted(by_image):
+        hits = by_image[img]
+        refs = faces[img]
+        gray_shape = (250, 200) if img.split('/')[1] == 'congress' else (200, 200)
+        centre = np.array([gray_shape[1] / 2, gray_shape[0] / 2])
+        dist = [np.linalg.norm((box[:2] + box[2:]) / 2 - centre) for _, box in hits]
+        central = int(np.argmin(dist))
+        who = person_of(img)
+        for k, (long_side, box) in enumerate(hits):
+            pts, is_human = None, False
+            ref = refs[int(np.argmax([tp_iou(box, f['rect']) for f in refs]))]
+            if k == central and img in human:
+                h = human[img]
+                mid = (h[0] + h[1]) / 2
+                if box[0] <= mid[0] < box[2] and box[1] <= mid[1] < box[3]:
+                    pts, is_human = h.copy(), True
+                    offsets.append(relative(pts, box) - relative(five_points(ref['points']), box))
+            if pts is None:
+                pts = five_points(ref['points'])
+            samples.append({'root': faces_dir, 'image': img, 'long': long_side, 'box': box, 'pts': pts,
+                            'split': 'report' if report_person(who) else 'train', 'who': who,
+                            'human': is_human, 'central': k == central, 'source': img.split('/')[1]})
+    return samples, (np.mean(offsets, 0) if offsets else np.zeros(10))
+
+
+def move_teacher_points(samples, offset):
+    """Teacher points moved by the mean human-minus-teacher offset (in units of the
+    box): the two place the eyes and mouth corners a little differently, and a net
+    trained on a mix would learn neither."""
+    for s in samples:
+        if not s['human']:
+            w, h = s['box'][2] - s['box'][0], s['box'][3] - s['box'][1]
+            s['pts'] = s['pts'] + offset.reshape(5, 2) * [w, h]
+
+
 def augmented_example(frames, s, side, rng):
-    frame, scale = frames.get(s['image'], s['long'])
+    """A training draw: the face turned in the plane, the box moved and resized as
+    the detector's box varies, mirrored, with other light, blur and noise."""
+    frame, scale = frames.get(s['root'], s['image'], s['long'])
     box = s['box'] * scale
     pts = s['pts'] * scale
     cx, cy = (box[0] + box[2]) / 2, (box[1] + box[3]) / 2
     size = box[2] - box[0]
-    angle = rng.uniform(-30, 30)
+    angle = float(np.clip(rng.normal(0, 10), -30, 30))
     m = cv2.getRotationMatrix2D((cx, cy), angle, 1.0)
     img = cv2.warpAffine(frame, m, (frame.shape[1], frame.shape[0]), flags=cv2.INTER_LINEAR,
                          borderMode=cv2.BORDER_REFLECT)
     pts = np.hstack([pts, np.ones((5, 1))]) @ m.T
-    # The detector's box wanders by about a tenth of its size and a step in scale.
-    size2 = size * rng.uniform(0.88, 1.14)
-    cx2 = cx + rng.uniform(-0.09, 0.09) * size
-    cy2 = cy + rng.uniform(-0.09, 0.09) * size
+    size2 = size * math.exp(rng.uniform(-0.1, 0.1))
+    cx2 = cx + rng.uniform(-0.07, 0.07) * size
+    cy2 = cy + rng.uniform(-0.07, 0.07) * size
     box2 = np.round([cx2 - size2 / 2, cy2 - size2 / 2, cx2 + size2 / 2, cy2 + size2 / 2]).astype(int)
     if box2[0] < 0 or box2[1] < 0 or box2[2] > img.shape[1] or box2[3] > img.shape[0] or box2[2] - box2[0] < 8:
         return None
@@ -162,12 +243,11 @@ def augmented_example(frames, s, side, rng):
     if rng.random() < 0.5:
         crop = crop[:, ::-1]
         pts = pts[FLIP].copy()
-        pts[:, 0] = w - pts[:, 0]
-    if rng.random() < 0.3:
-        k = rng.choice([3, 5])
-        crop = cv2.GaussianBlur(crop, (k, k), 0)
+        pts[:, 0] = w - 1 - pts[:, 0]
+    if rng.random() < 0.25:
+        crop = cv2.GaussianBlur(crop, (3, 3), 0)
     crop = crop * rng.uniform(0.6, 1.4) + rng.uniform(-40, 40)
-    crop = crop + rng.normal(0, rng.uniform(0, 8), crop.shape)
+    crop = crop + rng.normal(0, rng.uniform(0, 6), crop.shape)
     crop = np.clip(crop, 0, 255).astype(np.uint8)
     x = patch_input(crop, (0, 0, crop.shape[1], crop.shape[0]), side)
     return x, np.array([0, 0, w, box2[3] - box2[1]]), pts
@@ -178,118 +258,206 @@ def relative(pts, box):
     return np.stack([(pts[:, 0] - box[0]) / w, (pts[:, 1] - box[1]) / h], 1).ravel()
 
 
-def nme(pred_rel, box, pts):
-    w, h = box[2] - box[0], box[3] - box[1]
-    p = pred_rel.reshape(5, 2) * [w, h] + box[:2]
+def absolute(rel, box):
+    return rel.reshape(5, 2) * [box[2] - box[0], box[3] - box[1]] + box[:2]
+
+
+def point_errors(pred_rel, box, pts):
+    """(NME over the eye distance, roll error in degrees) of one face."""
+    p = absolute(pred_rel, box)
     iod = np.linalg.norm(pts[0] - pts[1])
-    return np.linalg.norm(p - pts, axis=1).mean() / iod
+    roll = lambda q: math.degrees(math.atan2(q[1, 1] - q[0, 1], q[1, 0] - q[0, 0]))
+    d = abs(roll(p) - roll(pts))
+    return np.linalg.norm(p - pts, axis=1).mean() / iod, min(d, 360 - d)
+
+
+def build_training_set(train, frames, side, draws, rng):
+    xs, ys = [], []
+    for s in train:  # every plain sample once, then augmented draws
+        x, box, pts = plain_example(frames, s, side)
+        xs.append(x)
+        ys.append(relative(pts, box))
+        for _ in range(draws):
+            e = augmented_example(frames, s, side, rng)
+            if e is not None:
+                xs.append(e[0])
+                ys.append(relative(e[2], e[1]))
+    return np.array(xs, np.float32), np.array(ys, np.float32)
+
+
+def make_model(inputs, hidden):
+    layers = []
+    for n in hidden:
+        layers += [torch.nn.Linear(inputs, n), torch.nn.Sigmoid()]
+        inputs = n
+    return torch.nn.Sequential(*layers, torch.nn.Linear(inputs, 10))
+
+
+def train_net(model, U, Y, args, work):
+    """Adam with a cosine schedule; a checkpoint after every epoch lets a run that was
+    cut off go on where it stopped."""
+    opt = torch.optim.Adam(model.parameters(), lr=args.lr, weight_decay=args.decay)
+    sched = torch.optim.lr_scheduler.CosineAnnealingLR(opt, args.epochs)
+    ckpt = os.path.join(work, 'checkpoint.pt')
+    first = 0
+    if os.path.exists(ckpt):
+        state = torch.load(ckpt)
+        if state['tag'] == run_tag(args):
+            model.load_state_dict(state['model'])
+            opt.load_state_dict(state['opt'])
+            sched.load_state_dict(state['sched'])
+            first = state['epoch']
+            print('resuming after epoch %d' % first)
+    ut, yt = torch.tensor(U), torch.tensor(Y)
+    for epoch in range(first, args.epochs):
+        t0 = time.time()
+        g = torch.Generator().manual_seed(args.seed * 1000 + epoch)
+        perm = torch.randperm(len(ut), generator=g)
+        total = 0.0
+        for k in range(0, len(ut), args.batch):
+            i = perm[k:k + args.batch]
+            loss = torch.nn.functional.smooth_l1_loss(model(ut[i]), yt[i], beta=0.02)
+            opt.zero_grad()
+            loss.backward()
+            opt.step()
+            total += float(loss) * len(i)
+        sched.step()
+        torch.save({'tag': run_tag(args), 'epoch': epoch + 1, 'model': model.state_dict(), 'opt': opt.state_dict(),
+                    'sched': sched.state_dict()}, ckpt + '.tmp')
+        os.replace(ckpt + '.tmp', ckpt)
+        print('epoch %d/%d loss %.5f (%.0f s)' % (epoch + 1, args.epochs, total / len(ut), time.time() - t0), flush=True)
+
+
+def run_tag(args):
+    keys = ('side', 'hidden', 'draws', 'epochs', 'seed', 'decay', 'lr', 'batch', 'sources', 'spread',
+            'teacher_offset', 'limit')
+    return json.dumps({k: getattr(args, k) for k in keys})
 
 
 def main(argv=None):
     ap = argparse.ArgumentParser(description=__doc__.splitlines()[0],
                                  epilog='Defaults reproduce models/mdnb.bin from the mined hits and labels.')
-    ap.add_argument('--data', default=tp.data_dir())
+    ap.add_argument('--data', default=tp.data_dir(), help='development data cache')
+    ap.add_argument('--faces', default=None, help='many-identity folder (default DATA/faces-data)')
+    ap.add_argument('--five-points', default=os.path.join(HERE, '..', '..', 'shared', 'data', 'faces',
+                                                          'lfw-train-5pt.tsv'), help='human five points of LFW')
+    ap.add_argument('--sources', default='lfw,congress,dev',
+                    help='comma-separated sources to train on (lfw, congress, dev)')
     ap.add_argument('--split', default=os.path.join(HERE, 'data_split.json'))
     ap.add_argument('--out', default=os.path.join(HERE, '..', 'models', 'mdnb.bin'))
-    ap.add_argument('--side', type=int, default=16, help='patch side (the net has side^2 inputs)')
-    ap.add_argument('--hidden', type=int, default=48)
-    ap.add_argument('--samples', type=int, default=24000, help='augmented training samples')
-    ap.add_argument('--epochs', type=int, default=60)
+    ap.add_argument('--work', default=None, help='folder for the built samples and checkpoints (default DATA/lm-work)')
+    ap.add_argument('--side', type=int, default=24, help='patch side (the net has side^2 inputs)')
+    ap.add_argument('--hidden', default='128,64', help='hidden layer sizes, comma-separated')
+    ap.add_argument('--draws', type=int, default=4, help='augmented draws per training face')
+    ap.add_argument('--epochs', type=int, default=40)
+    ap.add_argument('--batch', type=int, default=128)
+    ap.add_argument('--lr', type=float, default=2e-3)
+    ap.add_argument('--spread', type=float, default=4.0, help='input deviations mapped to the unit range')
     ap.add_argument('--seed', type=int, default=7)
-    ap.add_argument('--keep-net', action='store_true', help='write the trained net even when it loses to the mean shape')
     ap.add_argument('--decay', type=float, default=1e-5, help='weight decay')
+    ap.add_argument('--teacher-offset', type=int, default=1,
+                    help='move teacher points by the mean human-minus-teacher offset (1) or not (0)')
+    ap.add_argument('--limit', type=int, default=0, help='train on at most this many faces (for the data curve)')
+    ap.add_argument('--report', default=None, help='write the figures as JSON to this file')
     args = ap.parse_args(argv)
+    args.faces = args.faces or os.path.join(args.data, 'faces-data')
+    args.work = args.work or os.path.join(args.data, 'lm-work')
+    args.hidden = [int(v) for v in str(args.hidden).split(',') if v]
+    args.sources = sorted(set(args.sources.split(',')))
+    tag = '%s-s%d-d%d-l%d-t%d' % ('+'.join(args.sources), args.side, args.draws, args.limit, args.teacher_offset)
+    args.work = os.path.join(args.work, tag + '-' + '-'.join(map(str, args.hidden)))
+    os.makedirs(args.work, exist_ok=True)
     torch.manual_seed(args.seed)
     torch.set_num_threads(1)
     rng = np.random.default_rng(args.seed)
 
     split = json.load(open(args.split))
-    samples = load_samples(args.data, split)
-    train = [s for s in samples if s['split'] == 'train']
-    report = [s for s in samples if s['split'] == 'report']
-    frames = Frames(args.data)
+    dev = load_dev_samples(args.data, split)
+    many, offset = (load_face_samples(args.faces, read_five_points(args.five_points),
+                                      [s for s in args.sources if s != 'dev'])
+                    if os.path.isdir(args.faces) else ([], np.zeros(10)))
+    if args.teacher_offset:
+        move_teacher_points(many, offset)
+        move_teacher_points(dev, offset)
+        print('teacher points moved by %s (box units)' % ' '.join('%.4f' % v for v in offset))
+    train = [s for s in many if s['split'] == 'train'] + ([s for s in dev if s['split'] == 'train']
+                                                          if 'dev' in args.sources else [])
+    if args.limit:
+        # A fixed subset of people, for the curve of data size against error.
+        people = sorted({s['who'] for s in train}, key=lambda p: hashlib.sha256(p.encode()).hexdigest())
+        keep = set(people[:args.limit])
+        train = [s for s in train if s['who'] in keep]
+    frames = Frames()
 
-    xs, ys = [], []
-    for s in train:  # every plain sample once, then augmented draws
-        x, box, pts = plain_example(frames, s, args.side)
-        xs.append(x)
-        ys.append(relative(pts, box))
-    # Draws go to identities evenly: two clips of one person would otherwise
-    # teach the net that person's face instead of faces.
-    groups = {}
-    for s in train:
-        groups.setdefault(identity_of(s['image'], split), []).append(s)
-    keys = sorted(groups)
-    while len(xs) < args.samples:
-        group = groups[keys[rng.integers(len(keys))]]
-        e = augmented_example(frames, group[rng.integers(len(group))], args.side, rng)
-        if e is not None:
-            xs.append(e[0])
-            ys.append(relative(e[2], e[1]))
-    X, Y = np.array(xs, np.float64), np.array(ys, np.float64)
-    mean, std = X.mean(0), X.std(0) + 1.0
-    spread = 6.0
-    U = net_inputs(X, mean, std, spread)
+    cache = os.path.join(args.work, 'samples.npz')
+    if os.path.exists(cache):
+        z = np.load(cache)
+        X, Y = z['X'], z['Y']
+    else:
+        t0 = time.time()
+        X, Y = build_training_set(train, frames, args.side, args.draws, rng)
+        np.savez(cache + '.tmp.npz', X=X, Y=Y)
+        os.replace(cache + '.tmp.npz', cache)
+        print('built %d samples from %d faces of %d people in %.0f s' % (len(X), len(train),
+              len({s['who'] for s in train}), time.time() - t0), flush=True)
+    mean, std = X.mean(0).astype(np.float64), X.std(0).astype(np.float64) + 1.0
+    U = net_inputs(X, mean, std, args.spread).astype(np.float32)
 
-    model = torch.nn.Sequential(torch.nn.Linear(U.shape[1], args.hidden), torch.nn.Sigmoid(),
-                                torch.nn.Linear(args.hidden, 10))
+    model = make_model(U.shape[1], args.hidden)
     with torch.no_grad():
-        model[2].bias.copy_(torch.tensor(Y.mean(0)))
-    opt = torch.optim.Adam(model.parameters(), lr=3e-3, weight_decay=args.decay)
-    sched = torch.optim.lr_scheduler.CosineAnnealingLR(opt, args.epochs)
-    ut, yt = torch.tensor(U, dtype=torch.float32), torch.tensor(Y, dtype=torch.float32)
-    t0 = time.time()
-    for epoch in range(args.epochs):
-        perm = torch.randperm(len(ut))
-        for k in range(0, len(ut), 128):
-            i = perm[k:k + 128]
-            loss = torch.nn.functional.smooth_l1_loss(model(ut[i]), yt[i], beta=0.02)
-            opt.zero_grad()
-            loss.backward()
-            opt.step()
-        sched.step()
-    print('trained %d samples (%d plain) for %d epochs in %.0f s' % (len(U), len(train), args.epochs, time.time() - t0))
+        model[-1].bias.copy_(torch.tensor(Y.mean(0)))
+    train_net(model, U, Y, args, args.work)
 
-    layers = [(model[0].weight.detach().double().numpy(), model[0].bias.detach().double().numpy(), 'sigmoid'),
-              (model[2].weight.detach().double().numpy(), model[2].bias.detach().double().numpy(), 'linear')]
-    net, scales = nw.quantise_mlp(layers, list(mean), list(std), spread=spread)
+    lin = [m for m in model if isinstance(m, torch.nn.Linear)]
+    layers = [(m.weight.detach().double().numpy(), m.bias.detach().double().numpy(),
+               'linear' if m is lin[-1] else 'sigmoid') for m in lin]
+    net, scales = nw.quantise_mlp(layers, list(mean), list(std), spread=args.spread)
     blob = nw.write_blob(net)
-    with open(args.out, 'wb') as f:
-        f.write(nw.write_container([blob]))
+    low = float((((X - mean) / (args.spread * std)) < -1).mean())
+    mean_shape = np.array([relative(s['pts'], s['box']) for s in train]).mean(0)
 
-    # Overflow check over the whole training set: the quantiser bounds the worst
-    # case; also count inputs that fall below -1 (they saturate to +1).
-    low = float((((X - mean) / (spread * std)) < -1).mean())
-    mean_shape = Y[:len(train)].mean(0)
-
-    def evaluate(subset):
-        got, base, gaps = [], [], []
+    def evaluate(subset, check=0):
+        """NME and roll error of the integer net and of the mean shape; the first
+        `check` faces also run through the reference integer pass, which must agree
+        with the vectorised one exactly."""
+        xs, boxes = [], []
         for s in subset:
             x, box, pts = plain_example(frames, s, args.side)
-            out, _ = nw.reference_run(net, [int(v) for v in x])
-            pred = np.array(out, np.float64) / 65535.0
-            fl = float_predict(model, x, mean, std, spread)
-            gaps.append(np.abs(pred - fl).max())
-            got.append(nme(pred, box, pts))
-            base.append(nme(mean_shape, box, pts))
-        return np.mean(got), np.mean(base), np.max(gaps)
+            xs.append(x)
+            boxes.append((box, pts))
+        out = nw.dense_run_batch(net, np.array(xs, np.int64))
+        for k in range(min(check, len(xs))):
+            ref, _ = nw.reference_run(net, [int(v) for v in xs[k]])
+            if list(ref) != [int(v) for v in out[k]]:
+                raise SystemExit('vectorised integer pass differs from the reference on face %d' % k)
+        got = np.array([point_errors(o / 65535.0, b, p) for o, (b, p) in zip(out, boxes)])
+        base = np.array([point_errors(mean_shape, b, p) for b, p in boxes])
+        return {'faces': len(subset), 'nme': float(got[:, 0].mean()), 'roll': float(got[:, 1].mean()),
+                'nme_mean_shape': float(base[:, 0].mean()), 'roll_mean_shape': float(base[:, 1].mean())}
 
-    print('%s: %d bytes, patch %dx%d, hidden %d, layer scales %s, inputs below -1: %.3f%%'
-          % (os.path.normpath(args.out), os.path.getsize(args.out), args.side, args.side, args.hidden, scales,
-             100 * low))
-    print('%-8s %6s %10s %12s %12s %14s' % ('split', 'faces', 'NME net', 'NME mean', 'better by', 'int vs float'))
-    figures = {}
-    for name, subset in (('train', train), ('report', report)):
-        a, b, g = evaluate(subset)
-        figures[name] = (a, b)
-        print('%-8s %6d %10.4f %12.4f %11.1f%% %14.5f' % (name, len(subset), a, b, 100 * (1 - a / b), g))
-    if report and figures['report'][0] >= figures['report'][1] and not args.keep_net:
-        # A net that places the points worse than the average shape on people
-        # it hasn't seen must not ship: the learnt mean shape goes instead.
-        with open(args.out, 'wb') as f:
-            f.write(nw.write_container([nw.write_blob(mean_shape_net(mean_shape))]))
-        print('the net is no better than the mean shape on the report split: wrote the learnt mean shape '
-              '(%s) to %s' % (' '.join('%.4f' % v for v in mean_shape), os.path.normpath(args.out)))
+    report_human = [s for s in many if s['split'] == 'report' and s['human']]
+    report_teacher = [s for s in many if s['split'] == 'report' and not s['human'] and s['central']]
+    groups = [('train (human points)', [s for s in train if s.get('human')][:2000], 20),
+              ('report, human points', report_human, 50),
+              ('report, teacher points (central faces)', report_teacher, 0),
+              ('development report split', [s for s in dev if s['split'] == 'report'], 0)]
+    figures = {'args': vars(args), 'scales': scales, 'inputs_below_minus_one': low}
+    print('%s: patch %dx%d, hidden %s, layer scales %s, inputs below -1: %.3f%%'
+          % (tag, args.side, args.side, args.hidden, scales, 100 * low))
+    print('| split | faces | NME net | NME mean shape | roll error net | roll error mean shape |')
+    print('|---|---|---|---|---|---|')
+    for name, subset, check in groups:
+        if not subset:
+            continue
+        f = evaluate(subset, check)
+        figures[name] = f
+        print('| %s | %d | %.4f | %.4f | %.2f | %.2f |' % (name, f['faces'], f['nme'], f['nme_mean_shape'],
+                                                          f['roll'], f['roll_mean_shape']), flush=True)
+    if args.report:
+        json.dump(figures, open(args.report, 'w'), indent=1, default=str)
+    with open(args.out, 'wb') as f:
+        f.write(nw.write_container([blob]))
+    print('wrote %s (%d bytes)' % (os.path.normpath(args.out), os.path.getsize(args.out)))
     return 0
 
 

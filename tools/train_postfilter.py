@@ -74,6 +74,21 @@ def load_hits(prefix, split):
     return feats[keep], np.array(labels), np.array(sets), [rows[i] for i in keep]
 
 
+def load_face_hits(prefix):
+    """True face hits of the many-identity folder (IoU >= 0.4 with a teacher face),
+    split by identity as the landmark trainer splits it. Its other hits are left out:
+    its teacher labels come from a search without upsampling, which misses small
+    faces in the background, so a hit far from every label may still be a face."""
+    import train_landmarks as tl
+    rows = [line.rstrip('\n').split('\t') for line in open(prefix + '.tsv')]
+    feats = np.fromfile(prefix + '.f32', dtype='<f4')
+    if feats.size != len(rows) * DIM:
+        raise SystemExit('%s.tsv and .f32 disagree: run dump_hits again' % prefix)
+    keep = [i for i, r in enumerate(rows) if float(r[3]) >= 0.4]
+    sets = np.array(['report' if tl.report_person(tl.person_of(rows[i][0])) else 'train' for i in keep])
+    return feats.reshape(len(rows), DIM)[keep], np.ones(len(keep), int), sets, [rows[i] for i in keep]
+
+
 def fit_logistic(x, y, l2, steps=30):
     """Class-balanced L2 logistic regression by Newton steps; returns (w, b)."""
     n, d = x.shape
@@ -106,12 +121,27 @@ def main(argv=None):
     ap.add_argument('--hits', default=None, help='prefix of the dump_hits output (default: DATA/labels/hits)')
     ap.add_argument('--split', default=os.path.join(HERE, 'data_split.json'))
     ap.add_argument('--out', default=os.path.join(HERE, '..', 'models', 'mdpb.bin'))
+    ap.add_argument('--faces', default=None,
+                    help='prefix of dump_hits output on the many-identity folder (default: '
+                         'DATA/faces-data/labels/hits when present; "none" to leave it out)')
+    ap.add_argument('--compare', default=os.path.join(HERE, '..', 'models', 'mdpb.bin'),
+                    help='payload whose figures are printed beside the new one (read before writing --out)')
     ap.add_argument('--l2', type=float, default=100.0, help='ridge weight on the standardised feature')
     ap.add_argument('--keep', type=float, default=0.999, help='share of training faces the bias keeps')
     args = ap.parse_args(argv)
 
     split = json.load(open(args.split))
     feats, labels, sets, rows = load_hits(args.hits or os.path.join(data_dir(), 'labels', 'hits'), split)
+    source = np.array(['dev'] * len(rows), dtype=object)
+    faces = args.faces or os.path.join(data_dir(), 'faces-data', 'labels', 'hits')
+    if faces != 'none' and os.path.exists(faces + '.tsv'):
+        f2, l2_, s2, r2 = load_face_hits(faces)
+        feats, labels, sets, rows = (np.vstack([feats, f2]), np.concatenate([labels, l2_]),
+                                     np.concatenate([sets, s2]), rows + r2)
+        source = np.concatenate([source, np.array(['faces'] * len(r2), dtype=object)])
+    before = None
+    if args.compare and os.path.exists(args.compare):
+        before = ilabs.read_ilabs(open(args.compare, 'rb').read())[0]
     train = sets == 'train'
     if train.sum() == 0 or labels[train].min() == labels[train].max():
         raise SystemExit('no usable training hits')
@@ -139,16 +169,26 @@ def main(argv=None):
 
     print('%s: %d bytes, linear term only, l2 %g, training faces kept >= %.1f%%'
           % (os.path.normpath(args.out), len(payload), args.l2, 100 * args.keep))
-    print('%-8s %8s %8s %12s %12s' % ('split', 'faces', 'false', 'faces kept', 'false removed'))
+    print('| split | faces | false hits | faces kept | false hits removed | before: kept | before: removed |')
+    print('|---|---|---|---|---|---|---|')
     plain = np.array([r[1] == '-' for r in rows])
+    dev = source == 'dev'
     for name, m in (('train', sets == 'train'), ('report', sets == 'report'),
-                    ('report*', (sets == 'report') & plain)):
-        passed, _ = decisions(quantised, feats[m])
+                    ('report, development data', (sets == 'report') & dev),
+                    ('report, development data, plain', (sets == 'report') & dev & plain),
+                    ('report, many-identity photos', (sets == 'report') & ~dev)):
         pos, neg = labels[m] == 1, labels[m] == 0
-        kept = passed[pos].mean() if pos.any() else float('nan')
-        removed = 1.0 - passed[neg].mean() if neg.any() else float('nan')
-        print('%-8s %8d %8d %11.1f%% %11.1f%%' % (name, pos.sum(), neg.sum(), 100 * kept, 100 * removed))
-    print('  (report*: the report split without mirrored and turned copies)')
+        cells = []
+        for model in (quantised, before):
+            if model is None:
+                cells += ['-', '-']
+                continue
+            passed, _ = decisions(model, feats[m])
+            kept = passed[pos].mean() if pos.any() else float('nan')
+            removed = 1.0 - passed[neg].mean() if neg.any() else float('nan')
+            cells += ['%.1f%% (%d)' % (100 * kept, passed[pos].sum()), '%.1f%% (%d)' % (100 * removed, (~passed[neg]).sum())]
+        print('| %s | %d | %d | %s |' % (name, pos.sum(), neg.sum(), ' | '.join(cells)))
+    print('(plain: without mirrored and turned copies)')
     # Where the report split's false hits come from, and those that pass.
     m = sets == 'report'
     passed, _ = decisions(quantised, feats[m])

@@ -172,10 +172,12 @@ TEST_F(RealPhotos, LandmarksLieNearTheTeacherPoints) {
         double err = 0.0;
         for (int i = 0; i < 5; ++i) {
             const double e = std::hypot(b[offsets[i]] - p.xy[i][0], b[offsets[i] + 1] - p.xy[i][1]) / iod;
-            EXPECT_LT(e, 0.5) << "point " << i;
+            EXPECT_LT(e, 0.35) << "point " << i;
             err += e / 5.0;
         }
-        EXPECT_LT(err, 0.3);
+        // The learnt mean shape is off by 0.19 on these faces; a net that looks
+        // at the face stays well under it.
+        EXPECT_LT(err, 0.15);
         // Image-left parts come first, the eyes above the nose above the mouth.
         EXPECT_LT(b[7], b[9]);
         EXPECT_LT(b[11], b[13]);
@@ -185,6 +187,41 @@ TEST_F(RealPhotos, LandmarksLieNearTheTeacherPoints) {
         sum += err;
     }
     RecordProperty("mean_normalised_point_error", std::to_string(sum / kPoints.size()));
+    EXPECT_LT(sum / kPoints.size(), 0.10);
+}
+
+// A face turned in the plane gets a roll angle of the turn's sign and about its
+// size: the photo is turned about the face centre (nearest neighbour) and the
+// teacher's eyes are turned with it.
+TEST_F(RealPhotos, RollFollowsAFaceTurnedInThePlane) {
+    const qcli::Image gray = qcli::toGray(qcli::loadImage(devdata::photo("SeanConnery.jpg")));
+    const Points& p = kPoints[3];
+    const double cx = (p.xy[0][0] + p.xy[1][0]) / 2.0, cy = (p.xy[0][1] + p.xy[3][1]) / 2.0;
+    for (double degrees : {-10.0, 15.0}) {
+        SCOPED_TRACE(degrees);
+        const double a = degrees * 3.14159265358979 / 180.0, c = std::cos(a), s = std::sin(a);
+        std::vector<unsigned char> frame(gray.pixels.size());
+        for (int y = 0; y < gray.height; ++y)
+            for (int x = 0; x < gray.width; ++x) {
+                // Source of target pixel (x, y) under a turn by +a (image axes, y down).
+                const int sx = static_cast<int>(std::lround(cx + c * (x - cx) + s * (y - cy)));
+                const int sy = static_cast<int>(std::lround(cy - s * (x - cx) + c * (y - cy)));
+                const bool in = sx >= 0 && sy >= 0 && sx < gray.width && sy < gray.height;
+                frame[static_cast<size_t>(y) * gray.width + x] =
+                    in ? gray.pixels[static_cast<size_t>(sy) * gray.width + sx] : 128;
+            }
+        auto turned = [&](int i, int axis) {
+            const double dx = p.xy[i][0] - cx, dy = p.xy[i][1] - cy;
+            return axis == 0 ? cx + c * dx - s * dy : cy + s * dx + c * dy;
+        };
+        const double expected = std::atan2(turned(1, 1) - turned(0, 1), turned(1, 0) - turned(0, 0)) * 180.0 /
+                                3.14159265358979;
+        std::vector<int> blocks(static_cast<size_t>(kMaxFaces) * kBlockInts, 0);
+        const int n = quorin_detect(frame.data(), gray.width, gray.height, blocks.data(), kMaxFaces, 0);
+        ASSERT_GE(n, 1);
+        EXPECT_GT(blocks[0] * expected, 0.0) << "roll " << blocks[0] << ", expected about " << expected;
+        EXPECT_NEAR(blocks[0], expected, 6.0);
+    }
 }
 
 }  // namespace
