@@ -373,14 +373,18 @@ def main(argv=None):
 
     split = json.load(open(args.split))
     dev = load_dev_samples(args.data, split)
-    many, offset = (load_face_samples(args.faces, read_five_points(args.five_points),
-                                      [s for s in args.sources if s != 'dev'])
+    # Every source is loaded so that all variants are judged on the same report faces;
+    # only --sources are trained on.
+    many, offset = (load_face_samples(args.faces, read_five_points(args.five_points), ['lfw', 'congress'])
                     if os.path.isdir(args.faces) else ([], np.zeros(10)))
+    if args.teacher_offset and 'lfw' not in args.sources:
+        # The offset comes from LFW's human labels and would carry their terms.
+        raise SystemExit('--teacher-offset 1 needs lfw among --sources')
     if args.teacher_offset:
         move_teacher_points(many, offset)
         move_teacher_points(dev, offset)
         print('teacher points moved by %s (box units)' % ' '.join('%.4f' % v for v in offset))
-    train = [s for s in many if s['split'] == 'train'] + ([s for s in dev if s['split'] == 'train']
+    train = [s for s in many if s['split'] == 'train' and s['source'] in args.sources] + ([s for s in dev if s['split'] == 'train']
                                                           if 'dev' in args.sources else [])
     if args.limit:
         # A fixed subset of people, for the curve of data size against error.

@@ -1,3 +1,4 @@
+#include <cmath>
 #include <gtest/gtest.h>
 
 #include <cstring>
@@ -348,20 +349,33 @@ TEST(ClassifierPythonWriter, ReadsTheToolsContainerAndAgreesWithItsReferenceRun)
     EXPECT_EQ(checked, 25);
 }
 
-TEST(ClassifierPythonWriter, MeanShapeModelPlacesTheSameShapeInEveryBox) {
+TEST(ClassifierPythonWriter, ShippedLandmarkNetKeepsItsPointsInTheBoxAndInOrder) {
+    // Whatever the patch, the shipped net's quantised weights must not wrap a
+    // sum into points outside the box or out of their anatomical order.
     const std::vector<uint8_t> image = sourcetree::readBytes(sourcetree::path("models/mdnb.bin"));
     NeuralClassifier c;
     ASSERT_NO_THROW(c.LoadClassifierData(image.data(), image.size()));
     uint32_t n = 0;
     ASSERT_TRUE(c.inputCount(&n));
-    std::vector<float> dark(n, 0.0f), bright(n, 5000.0f);
-    float a[10], b[10];
-    uint32_t best = 0;
-    c.Classify(dark.data(), n, &best, a, 10);
-    c.Classify(bright.data(), n, &best, b, 10);
-    for (int i = 0; i < 10; ++i) {
-        EXPECT_EQ(a[i], b[i]);
-        EXPECT_GT(a[i], 0.0f);
-        EXPECT_LT(a[i] * 10000.0f / 65535.0f, 1.0f);  // inside the box
+    const uint32_t side = uint32_t(std::sqrt(double(n)));
+    ASSERT_EQ(side * side, n) << "the locator needs a square patch";
+    const float flat = 211676.0f / float(n);
+    std::vector<std::vector<float>> patches = {std::vector<float>(n, flat), std::vector<float>(n, 0.0f)};
+    std::vector<float> lit(n);  // lit from the left: half the face twice as bright
+    for (uint32_t i = 0; i < n; ++i) lit[i] = (i % side < side / 2 ? 2.0f : 1.0f) * flat / 1.5f;
+    patches.push_back(lit);
+    for (const auto& patch : patches) {
+        float v[10];
+        uint32_t best = 0;
+        c.Classify(patch.data(), n, &best, v, 10);
+        for (float& x : v) x = x * 10000.0f / 65535.0f;
+        for (int i = 0; i < 10; ++i) {
+            EXPECT_GT(v[i], 0.0f) << i;
+            EXPECT_LT(v[i], 1.0f) << i;
+        }
+        EXPECT_LT(v[0], v[2]);                      // left eye left of the right eye
+        EXPECT_LT(v[6], v[8]);                      // mouth corners likewise
+        EXPECT_LT(std::max(v[1], v[3]), v[5]);      // eyes above the nose
+        EXPECT_LT(v[5], std::min(v[7], v[9]));      // nose above the mouth
     }
 }
