@@ -59,7 +59,7 @@ public:
     // ensures: radius() == floor(3 * sigma), kernel of 2 * radius + 1
     //          coefficients with anchor radius, symmetric, summing to 1; a
     //          sigma below 1/3 gives the single coefficient 1.
-    // throws:  std::bad_alloc for a sigma below -1/3, or one so large or
+    // throws:  std::bad_alloc for a negative sigma (its radius is negative), or one so large or
     //          undefined (NaN, infinite) that no kernel can be made; the filter
     //          is then released.
     void init(float sigma);
