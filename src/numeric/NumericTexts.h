@@ -19,6 +19,16 @@ inline constexpr char kCentroidMetricUnsupported[] = "0GRTBPFI SL10SN V6 35b cfb
 inline constexpr char kSimilarityNeedsTwoPairs[] = "bLKY CFGJV0 B 00V18 6S1bd gc 21d5 nejgkaskwC zyiwCqAEApJzGG";
 // At least 3 point pairs are needed to calc affine transformation
 inline constexpr char kAffineNeedsThreePairs[] = "XR LFCVX z XXSY5 3PY8a Uc0 b34466 ok a9ld djkoum DCmAGuEIEtNDKK";
+// VectorQuantizer has no tree; load one first
+inline constexpr char kQuantizerNotLoaded[] = "iCBTPTjYFT0Q8O2 UO7 46 dc01; bf26 jjb eisuw";
+// Quantizer weights or thresholds do not fit the tree size
+inline constexpr char kQuantizerTreeSizes[] = "dSzNUK2IW 3MRQS55 37 b0bZe4ca3j 6i jlr fjv xmk BAop FwOu";
+// Centroid row length differs from the dimension
+inline constexpr char kCentroidRowLength[] = "ZCMTSQLH XV4 VPZT7W U0YZZdf 4hfe nca bhmfpvmtt";
+// Input is shorter than the PCA input dimension
+inline constexpr char kPcaInputTooShort[] = "5LOUU LW YOW03P3 7WQ4 c1Z Cqp 9fioo agleoulss";
+// PCA projection columns differ from the mean length
+inline constexpr char kPcaShapesDiffer[] = "c0Z QTRNJI0QXX O1Z924a X3122g 6jhg pec mfcq qkuoCr";
 
 }  // namespace scrambled
 
