@@ -254,8 +254,6 @@ TEST(Filters, JsonFormsAndFactories) {
          "\"higherFilter\":{\"sigmaHorizontal\":2,\"sigmaVertical\":2}}}",
          "{\"lowerFilter\":{\"sigmaHorizontal\":1,\"sigmaVertical\":1}, "
          "\"higherFilter\":{\"sigmaHorizontal\":2,\"sigmaVertical\":2}}"},
-        {"{\"name\":\"QV_FILTER2D_GAUSSIAN\",\"param\":{\"sigmaHorizontal\":1,\"sigmaVertical\":x}}",
-         "{\"sigmaHorizontal\":1,\"sigmaVertical\":0}"},
         {"{\"name\":\"QV_FILTER1D_DOG\",\"param\":{}}", ""},
     };
     for (const Case& c : twoD) {
