@@ -86,6 +86,9 @@ Options parseOptions(const std::vector<std::string>& args) {
     } else if (arg == "--json") {
       o.jsonPath = takeValue();
       if (o.jsonPath.empty()) throw UsageError("--json needs a file name");
+    } else if (arg == "--jvw") {
+      o.jvwPath = takeValue();
+      if (o.jvwPath.empty()) throw UsageError("--jvw needs a file name");
     } else if (arg == "--") {
       for (++i; i < args.size(); ++i) o.images.push_back(args[i]);
     } else if (arg.size() > 1 && arg[0] == '-') {
@@ -104,6 +107,10 @@ Options parseOptions(const std::vector<std::string>& args) {
   if (o.search360 && modeGiven) throw UsageError("--360 chooses its own mode; drop --mode");
   if (o.search360 && !o.scaled && (o.annotateRaw || !o.annotatePath.empty()))
     throw UsageError("annotating with --360 needs --scaled (only scaled results are on the frame's own axes)");
+  if (o.search360 && !o.scaled && !o.jvwPath.empty())
+    throw UsageError("--jvw with --360 needs --scaled (only scaled results are on the frame's own axes)");
+  if (!o.jvwPath.empty() && (o.jvwPath == o.jsonPath || o.jvwPath == o.annotatePath))
+    throw UsageError("--jvw needs a file of its own");
   return o;
 }
 
@@ -140,6 +147,12 @@ Options:
   --annotate-raw     with --raw: write the frames, annotated, to stdout
                      (JSON then only goes to --json FILE)
   --json FILE        write the JSON lines to FILE instead of stdout
+  --jvw FILE         also write every face as a JVW record file: line 1
+                     "JVW@QV<TAB>VERSION=1", then one {"obj":"FACE",
+                     "content":{...}} line per face, with the rectangle and
+                     landmarks in pixels of the image as given and the image's
+                     name (or "frame N" for --raw) as filePath; the entry
+                     points report no score, so faceScore keeps its default
   -h, --help         show this text
 
 Exit status: 0 all inputs done, 1 an input or output failed (unreadable or

@@ -25,6 +25,7 @@ struct Options {
   int rawHeight = 0;
   bool annotateRaw = false;
   std::string jsonPath;
+  std::string jvwPath;
   std::vector<std::string> images;
 
   int effectiveMode() const { return mode >= 0 ? mode : (raw ? 1 : 2); }

@@ -19,6 +19,7 @@
 #include "Faces.h"
 #include "ImageIo.h"
 #include "Json.h"
+#include "JvwOutput.h"
 #include "Options.h"
 #include "RawStream.h"
 
@@ -60,7 +61,7 @@ std::vector<Face> inImagePixels(const std::vector<Face>& faces, Entry entry, int
 
 int worse(int a, int b) { return a > b ? a : b; }
 
-int runImages(const Options& o, JsonSink& json) {
+int runImages(const Options& o, JsonSink& json, JvwOutput* jvw) {
   std::unique_ptr<EngineSession> engine;
   const Entry entry = chooseEntry(o);
   int status = kOk;
@@ -101,6 +102,10 @@ int runImages(const Options& o, JsonSink& json) {
     json.line("{\"file\":" + jsonString(path) + ",\"width\":" + std::to_string(colour.width) +
               ",\"height\":" + std::to_string(colour.height) + frameFields(o, entry) +
               ",\"faces\":" + facesJson(result.faces) + "}");
+    if (jvw && !jvw->add(path, inImagePixels(result.faces, entry, o.rotation, colour.width, colour.height))) {
+      complain("'" + path + "': this name can't be stored in a JVW record; its faces are left out of --jvw");
+      status = worse(status, kInputFailed);
+    }
     if (!o.annotatePath.empty()) {
       try {
         drawFaces(colour, inImagePixels(result.faces, entry, o.rotation, colour.width, colour.height));
@@ -141,7 +146,7 @@ class Progress {
   Clock::time_point last_;
 };
 
-int runRaw(const Options& o, JsonSink& json) {
+int runRaw(const Options& o, JsonSink& json, JvwOutput* jvw) {
   const int width = o.rawWidth, height = o.rawHeight;
   const std::string problem = frameProblem(o, width, height);
   if (!problem.empty()) {
@@ -200,6 +205,7 @@ int runRaw(const Options& o, JsonSink& json) {
     if (result.orientationReported) line += ",\"orientation\":" + std::to_string(result.orientation);
     line += ",\"faces\":" + facesJson(result.faces) + "}";
     json.line(line);
+    if (jvw) jvw->add("frame " + std::to_string(frames), inImagePixels(result.faces, entry, o.rotation, width, height));
     if (o.annotateRaw) {
       canvas.pixels.swap(frame);
       drawFaces(canvas, inImagePixels(result.faces, entry, o.rotation, width, height));
@@ -254,7 +260,25 @@ int main(int argc, char** argv) {
   } else if (!options.annotateRaw) {
     json.file = stdout;
   }
-  int status = options.raw ? runRaw(options, json) : runImages(options, json);
+  // Opened before any work, so that an unwritable file fails at once.
+  std::unique_ptr<JvwOutput> jvw;
+  if (!options.jvwPath.empty()) {
+    try {
+      jvw = std::make_unique<JvwOutput>(options.jvwPath);
+    } catch (const JvwOutputError& e) {
+      complain(e.what());
+      return kInputFailed;
+    }
+  }
+  int status = options.raw ? runRaw(options, json, jvw.get()) : runImages(options, json, jvw.get());
+  if (jvw) {
+    try {
+      jvw->finish();
+    } catch (const JvwOutputError& e) {
+      complain(e.what());
+      status = worse(status, kInputFailed);
+    }
+  }
   if (json.failed) {
     complain("cannot write the JSON output");
     status = worse(status, kInputFailed);

@@ -25,6 +25,9 @@
 #include "Faces.h"
 #include "ImageIo.h"
 #include "Json.h"
+#include "core/FaceData.h"
+#include "quorin/JvwFile.h"
+#include "support/DevData.h"
 #include "Options.h"
 #include "RawStream.h"
 
@@ -255,10 +258,14 @@ TEST(OptionParsing, RefusesContradictions) {
            {"--360", "--mode", "1", "a.png"},
            {"--360", "--annotate", "o.png", "a.png"},
            {"--360", "--raw", "8x8", "--annotate-raw"},
+           {"--jvw", "", "a.png"},
+           {"--360", "--jvw", "f.jvw", "a.png"},
+           {"--jvw", "f.txt", "--json", "f.txt", "a.png"},
        }) {
     EXPECT_THROW(parseOptions(args), UsageError) << ::testing::PrintToString(args);
   }
   EXPECT_NO_THROW(parseOptions({"--360", "--scaled", "--annotate", "o.png", "a.png"}));
+  EXPECT_EQ(parseOptions({"--jvw=f.jvw", "--raw", "8x8"}).jvwPath, "f.jvw");
   EXPECT_TRUE(parseOptions({"--help", "--bogus"}).help);
 }
 
@@ -525,4 +532,62 @@ TEST(CommandLine, AnnotatedRawFramesKeepTheStreamSize) {
   EXPECT_EQ(r.out.size(), frames.size());
   std::string lines = readText(json);
   EXPECT_EQ(std::count(lines.begin(), lines.end(), '\n'), 2);
+}
+
+// ---------------------------------------------------------------------------
+// The record file of real detections: the faces of the JSON line, in the same
+// pixels, read back through JvwReader and written again byte for byte.
+TEST(JvwOutput, RecordsTheFacesOfTheJsonLineAndRoundTrips) {
+  const std::string photo = devdata::photo("tracking_faces.jpg");
+  if (!devdata::exists(photo)) GTEST_SKIP() << devdata::missingNote();
+  const std::string jvw = tempDir() + "/faces.jvw";
+  CliRun r = runCli({"--jvw", jvw, photo});
+  SKIP_IF_ENGINE_CANNOT_START(r);
+  ASSERT_EQ(r.status, 0) << r.err;
+
+  JvwReader reader(jvw);
+  const std::vector<FaceData> faces = reader.readFaces();
+  ASSERT_GE(faces.size(), 2u) << "the development photo shows three faces";
+  std::size_t rects = 0;
+  for (std::size_t at = r.out.find("\"rect\""); at != std::string::npos; at = r.out.find("\"rect\"", at + 1)) ++rects;
+  EXPECT_EQ(rects, faces.size());
+  for (const FaceData& f : faces) {
+    EXPECT_EQ(f.filePath(), photo);
+    const Rect2<int32_t>& rect = f.faceRect();
+    const std::string jsonRect = "{\"left\":" + std::to_string(rect.left) + ",\"top\":" + std::to_string(rect.top) +
+                                 ",\"right\":" + std::to_string(rect.right) + ",\"bottom\":" +
+                                 std::to_string(rect.bottom) + "}";
+    EXPECT_NE(r.out.find(jsonRect), std::string::npos) << jsonRect;
+    const Point2<float> eye = f.landmark("leftEye");
+    const std::string jsonEye = "\"leftEye\":[" + std::to_string(static_cast<long>(eye.x)) + "," +
+                                std::to_string(static_cast<long>(eye.y)) + "]";
+    EXPECT_NE(r.out.find(jsonEye), std::string::npos) << jsonEye;
+    EXPECT_EQ(f.landmarks().size(), 5u);
+  }
+
+  const std::string again = tempDir() + "/faces-again.jvw";
+  JvwWriter writer(again);
+  writer.writeFaces(faces);
+  EXPECT_EQ(readText(again), readText(jvw));
+}
+
+TEST(JvwOutput, UnwritableFileAndUnstorableNamesFailClearly) {
+  const std::string pgm = writeTemp("jvw-plain.pgm", pgmBytes(toGray(pattern(64, 48, 3))));
+  CliRun nowhere = runCli({"--jvw", tempDir() + "/no/such/dir/x.jvw", pgm});
+  EXPECT_EQ(nowhere.status, 1);
+  EXPECT_NE(nowhere.err.find("QV JVW file open error"), std::string::npos) << nowhere.err;
+
+  const std::string photo = devdata::photo("tracking_faces.jpg");
+  if (!devdata::exists(photo)) GTEST_SKIP() << devdata::missingNote();
+  const std::string odd = tempDir() + "/we\"ird{.jpg";
+  ASSERT_EQ(std::system(("cp " + shellQuote(photo) + " " + shellQuote(odd)).c_str()), 0);
+  const std::string jvw = tempDir() + "/odd.jvw";
+  CliRun r = runCli({"--jvw", jvw, odd, photo});
+  SKIP_IF_ENGINE_CANNOT_START(r);
+  EXPECT_EQ(r.status, 1);
+  EXPECT_NE(r.err.find("can't be stored in a JVW record"), std::string::npos) << r.err;
+  JvwReader reader(jvw);
+  const std::vector<FaceData> faces = reader.readFaces();
+  ASSERT_FALSE(faces.empty()) << "the other image's faces are still written";
+  for (const FaceData& f : faces) EXPECT_EQ(f.filePath(), photo);
 }
