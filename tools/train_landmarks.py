@@ -349,7 +349,7 @@ def main(argv=None):
     ap.add_argument('--side', type=int, default=24, help='patch side (the net has side^2 inputs)')
     ap.add_argument('--hidden', default='128,64', help='hidden layer sizes, comma-separated')
     ap.add_argument('--draws', type=int, default=4, help='augmented draws per training face')
-    ap.add_argument('--epochs', type=int, default=40)
+    ap.add_argument('--epochs', type=int, default=24)
     ap.add_argument('--batch', type=int, default=128)
     ap.add_argument('--lr', type=float, default=2e-3)
     ap.add_argument('--spread', type=float, default=4.0, help='input deviations mapped to the unit range')
