@@ -2,18 +2,51 @@
 #define QUORIN_QUORINAPI_H
 
 /*
- * libquorinapi: on-device face detection and tracking.
+ * libquorinapi: on-device face detection and tracking, C entry points.
  *
- * One session per process, driven from one thread at a time. Frames are 8-bit
- * gray, width*height bytes without row padding. Every face is reported as a block
- * of 17 ints at results + 17*k, best score first:
+ * One session per process, driven from one thread at a time (no entry is
+ * thread-safe, quorin_init and quorin_release included). Frames are 8-bit
+ * gray, width*height bytes without row padding.
+ *
+ * Result blocks. Every face is reported as a block of 17 ints at
+ * results + 17*k, best score first:
  *   [0] roll angle in degrees   [1],[2] untouched
  *   [3] top  [4] bottom  [5] left  [6] right
  *   [7],[8] left eye   [9],[10] right eye
  *   [11],[12] left mouth corner  [13],[14] right mouth corner  [15],[16] nose
- * At most 100 faces are written per call. The detect entries may overwrite the
- * frame they are given (a rotated work frame is written back into it).
- * Errors inside the engine leave these functions as C++ exceptions.
+ * "Left" is the image's left. Blocks are written for k < min(faces found,
+ * maxFaces, 100), with maxFaces taken as unsigned; nothing else in `results`
+ * is touched.
+ *
+ * Rules shared by the seven detect entries (image, width, height, results,
+ * maxFaces):
+ *   requires: `image` writable and width*height bytes: the entries may write
+ *     the turned work frame back into it. `results` room for 17*maxFaces ints
+ *     when maxFaces > 0 (the Scaled entries map that many blocks when more
+ *     than 100 faces are found), for 17*100 ints when maxFaces < 0; it may be
+ *     null when maxFaces is 0.
+ *   ensures: returns min(faces found, maxFaces), compared as signed ints: so
+ *     maxFaces 0 runs the detection and returns 0 with nothing written, and a
+ *     negative maxFaces writes up to 100 blocks and returns that negative
+ *     number (the Scaled entries then leave the blocks in pixels, unmapped).
+ *     Without a session (before quorin_init, after quorin_release) returns 0
+ *     at once and touches nothing, whatever the arguments.
+ *   throws: errors leave as C++ exceptions of the engine's runtime; a host
+ *     that calls from C must not let one reach it (build the calling layer as
+ *     C++ and catch there). The classes are declared in <quorin/Errors.h> and
+ *     <quorin/ApiError.h>:
+ *     - qv_invalid_argument, before any session state changes: a null
+ *       `image` ("quorin: frame pointer is null"), width or height <= 0
+ *       ("quorin: frame width and height must be positive"), width*height
+ *       above INT32_MAX ("quorin: frame too large"), a null `results` with
+ *       maxFaces != 0 ("quorin: result pointer is null");
+ *     - ApiError "QVFace Detection API not initialized properly" in a session
+ *       whose quorin_init failed;
+ *     - ApiError "QVFace Detection API detect error" when the engine fails on
+ *       the frame, "QVFace Detection API set face size range error" when it
+ *       refuses the frame's face sizes, and, from the 360 entries, the mode
+ *       errors of quorin_setDetectionMode;
+ *     - std::bad_alloc when memory runs out.
  */
 
 #include "quorin/export.h"
@@ -22,40 +55,68 @@
 extern "C" {
 #endif
 
-/* Opens the session: loads the built-in models and selects detection mode 2. */
+/* Opens the session: loads the built-in models and selects detection mode 2.
+ * ensures: an open session in mode 2, orientation unknown (-1). A session that
+ *   is already open is closed first.
+ * throws: ApiError "QVFace Detection API initialization error" when the models
+ *   or the configuration can't be loaded; the session is then open but
+ *   unusable (the detect entries raise "QVFace Detection API not initialized
+ *   properly") until quorin_release or a new quorin_init. std::bad_alloc. */
 QUORIN_EXPORT void quorin_init(void);
 
-/* Closes the session; a second call does nothing. */
+/* Closes the session and frees all its memory.
+ * ensures: no session; without one this does nothing. Never throws. */
 QUORIN_EXPORT void quorin_release(void);
 
-/* 0: fast (long side 240), 1: tracking (320, Kalman tracker), 2: high (640).
- * Requires an open session for any mode other than the current one. */
+/* Selects the detection mode: 0 fast (work frame long side 240, no tracker),
+ * 1 tracking (320, Kalman tracker), 2 thorough (640, no tracker).
+ * ensures: the current mode again changes nothing at all (the tracker keeps
+ *   its faces). A new mode 0..2 is set and discards the tracked faces. Any
+ *   other value keeps the mode. Except for the current mode, the history of
+ *   result blocks is cleared.
+ * throws: ApiError "QVFace Detection API not initialized properly" for a new
+ *   mode 0..2 without a session; ApiError "QVFace Detection API set search
+ *   step error" or "QVFace Detection API set mode error" in a session whose
+ *   quorin_init failed. */
 QUORIN_EXPORT void quorin_setDetectionMode(unsigned int mode);
 
-/* Detects faces in a frame turned clockwise by rotation (0, 90, 180, 270);
- * coordinates are pixels of the rotated frame. Returns the number of faces
- * (min(found, maxFaces)); 0 without a session. */
+/* Detects faces in the frame turned clockwise by `rotation` (0, 90, 180, 270;
+ * any other value leaves the frame unturned), after shrinking it to the long
+ * side of the current mode. Coordinates are pixels of the turned frame at its
+ * full size. See the shared rules above. */
 QUORIN_EXPORT int quorin_detect(unsigned char* image, int width, int height,
                                 int* results, int maxFaces, int rotation);
 
 /* As quorin_detect, with coordinates mapped to -1000..1000 on the axes of the
- * unrotated frame. */
+ * unturned frame. */
 QUORIN_EXPORT int quorin_detectScaled(unsigned char* image, int width, int height,
                                       int* results, int maxFaces, int rotation);
 
-/* Orientation-searching entries: try the four rotations until faces appear and
- * remember the one that worked. Tracking variants follow it in mode 1; High
- * variants search in mode 2. */
+/* Orientation search: while the orientation is unknown, tries the rotations
+ * 0, 90, 180, 270 in mode 0 on a copy of the frame and keeps the first with
+ * faces; once known, detects at it in mode 1 (tracking). After a successful
+ * search five frames may pass without faces; after them the first empty frame
+ * makes the orientation unknown again. Coordinates as quorin_detect. */
 QUORIN_EXPORT int quorin_detect360Tracking(unsigned char* image, int width, int height,
                                            int* results, int maxFaces);
+/* As quorin_detect360Tracking, coordinates as quorin_detectScaled. */
 QUORIN_EXPORT int quorin_detect360TrackingScaled(unsigned char* image, int width, int height,
                                                  int* results, int maxFaces);
+
+/* Orientation search in mode 2: tries up to four rotations, starting at the
+ * one that worked last and going on by 90 degrees, on the host's frame itself
+ * (a turned attempt may leave the frame turned for the next one). No faces at
+ * all four makes the orientation unknown. Coordinates as quorin_detect. */
 QUORIN_EXPORT int quorin_detect360High(unsigned char* image, int width, int height,
                                        int* results, int maxFaces);
+/* As quorin_detect360High, coordinates as quorin_detectScaled. */
 QUORIN_EXPORT int quorin_detect360HighScaled(unsigned char* image, int width, int height,
                                              int* results, int maxFaces);
 
-/* As quorin_detect360TrackingScaled; stores the orientation in use (or -1). */
+/* As quorin_detect360TrackingScaled, then stores the orientation in use (0,
+ * 90, 180, 270, or -1 after a search that found nothing) in *orientation.
+ * Without a session it stores the last session's orientation (0 before any).
+ * throws: qv_invalid_argument "quorin: orientation pointer is null" first. */
 QUORIN_EXPORT int quorin_detect360TrackingScaled_ornt(unsigned char* image, int width, int height,
                                                       int* results, int maxFaces, int* orientation);
 

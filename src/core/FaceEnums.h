@@ -1,67 +1,7 @@
 #ifndef QUORIN_CORE_FACEENUMS_H
 #define QUORIN_CORE_FACEENUMS_H
 
-#include <cstdint>
-#include <string>
-
-// Four small classes of the face records, each wrapping one enumeration value.
-// -1 means "not set". The text form is the quoted label of the value; the
-// engine only stores, writes and reads these values.
-
-class FaceAgeInterval {
-public:
-    FaceAgeInterval() = default;
-    explicit FaceAgeInterval(int32_t v) : value(v) {}
-    // Quoted label; a value outside -1..4 gives JsonError "Json serialization error".
-    std::string toJson() const;
-    // Whole text must equal a quoted label, else "Json deserialization error".
-    void fromJson(const std::string& text);
-    bool operator==(const FaceAgeInterval& o) const { return value == o.value; }
-
-    int32_t value = -1;
-};
-
-class FaceRace {
-public:
-    FaceRace() = default;
-    explicit FaceRace(int32_t v) : value(v) {}
-    std::string toJson() const;  // values -1..3
-    void fromJson(const std::string& text);
-    bool operator==(const FaceRace& o) const { return value == o.value; }
-
-    int32_t value = -1;
-};
-
-class FaceGender {
-public:
-    FaceGender() = default;
-    explicit FaceGender(int32_t v) : value(v) {}
-    std::string toJson() const;  // values -1..1
-    void fromJson(const std::string& text);
-    bool operator==(const FaceGender& o) const { return value == o.value; }
-
-    int32_t value = -1;
-};
-
-class FacePose {
-public:
-    FacePose() = default;
-    explicit FacePose(int32_t v) : value(v) {}
-    std::string toJson() const;  // values -1..6
-    void fromJson(const std::string& text);
-
-    // Pose of the mirrored face: 1<->2, 3<->4, 5<->6; -1 and 0 stay.
-    // Any other value throws JsonError "Invalid pose".
-    FacePose flip() const;
-    // True for 3..6 and for "not set" (-1): the value taken as unsigned is above 2.
-    bool wildPose() const { return static_cast<uint32_t>(value) > 2u; }
-
-    struct Compare {
-        bool operator()(const FacePose& a, const FacePose& b) const { return a.value < b.value; }
-    };
-    bool operator==(const FacePose& o) const { return value == o.value; }
-
-    int32_t value = -1;
-};
+// The declaration is public: a host includes it as <quorin/FaceEnums.h>.
+#include "quorin/FaceEnums.h"
 
 #endif

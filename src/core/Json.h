@@ -7,21 +7,14 @@
 #include <type_traits>
 #include <vector>
 
+#include "quorin/JsonError.h"
+
 // The engine's own small text codec. It is deliberately not a general JSON
 // library: a read gives one level only (key -> raw value text), nested values
 // stay text until their owner reads them, there are no escapes, brackets are
 // matched by counting, and anything up to the next comma is a bare value.
 // Texts written by the engine and the built-in configuration rely on exactly
 // this dialect, so its quirks are behaviour, not bugs.
-
-class JsonError : public std::exception {
-public:
-    explicit JsonError(const char* message) : message_(message ? message : "") {}
-    const char* what() const noexcept override { return message_.c_str(); }
-
-private:
-    std::string message_;
-};
 
 extern const char* const kJsonSerializationError;    // "Json serialization error"
 extern const char* const kJsonDeserializationError;  // "Json deserialization error"

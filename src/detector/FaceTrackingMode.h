@@ -1,13 +1,7 @@
 #ifndef QUORIN_DETECTOR_FACETRACKINGMODE_H
 #define QUORIN_DETECTOR_FACETRACKINGMODE_H
 
-// Which tracker follows faces between frames. 0 or any value outside 1..4: none.
-enum QVFaceTrackingMode : int {
-    QV_TRACKING_NONE = 0,
-    QV_TRACKING_SIMPLE = 1,
-    QV_TRACKING_KF = 2,
-    QV_TRACKING_PF = 3,
-    QV_TRACKING_CPF = 4,
-};
+// The declaration is public: a host includes it as <quorin/QVFaceTrackingMode.h>.
+#include "quorin/QVFaceTrackingMode.h"
 
 #endif

@@ -7,7 +7,6 @@
 #include <vector>
 
 #include "core/FaceData.h"
-#include "quorin/export.h"
 
 class IMAGE;
 class NeuralClassifier;
@@ -75,6 +74,6 @@ struct FaceSquare {
 // From landmark points to the face square they imply. With reorder (layouts 0
 // and 1 only) swaps eyes and mouth corners into a consistent handedness first,
 // in the record itself.
-QUORIN_EXPORT void MapFPts2GTRc(FacePointSet* points, FaceSquare* square, bool reorder);
+void MapFPts2GTRc(FacePointSet* points, FaceSquare* square, bool reorder);
 
 #endif

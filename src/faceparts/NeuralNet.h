@@ -6,8 +6,6 @@
 #include <cstdlib>
 #include <memory>
 
-#include "quorin/export.h"
-
 // A small locally connected feed-forward net in 32-bit integer arithmetic.
 // Activations are 16.16 fixed point, weights i16, outputs of the soft-max forms
 // 0..10000. The whole net lives in one serialised blob; a loaded net points into
@@ -23,9 +21,9 @@ enum tagTXF_TYPE : uint32_t {
 };
 
 // 16.16 logistic function by a 257-entry table with linear interpolation.
-QUORIN_EXPORT int32_t Sigmoid16(int32_t x);
+int32_t Sigmoid16(int32_t x);
 // 16.16 division a / b without 64-bit arithmetic; b == 0 saturates by the sign of a.
-QUORIN_EXPORT int32_t Div16(int32_t a, int32_t b);
+int32_t Div16(int32_t a, int32_t b);
 // Truncation toward zero to i32 that saturates and maps NaN to 0.
 int32_t SaturatingTrunc(double v);
 

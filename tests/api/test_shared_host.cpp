@@ -1,14 +1,16 @@
-// A host linked against the shared library alone: the exported records and
-// entries must be reachable through the library's visible symbols.
+// A host linked against the shared library alone, with the public headers
+// only: the exported records and entries must be reachable through the
+// library's visible symbols.
 
 #include <gtest/gtest.h>
 
 #include <stdexcept>
 #include <vector>
 
-#include "core/ApiError.h"
-#include "core/FaceData.h"
-#include "core/QVFace.h"
+#include "quorin/ApiError.h"
+#include "quorin/FaceData.h"
+#include "quorin/JsonError.h"
+#include "quorin/QVFace.h"
 #include "quorin/quorinapi.h"
 
 namespace {
@@ -29,6 +31,12 @@ TEST(SharedLibraryHost, RecordsTravelThroughTheExportedInterface) {
         // The library's own exception type is seen by the host.
     }
     EXPECT_THROW(copy.landmark("chin"), std::invalid_argument);
+
+    // The text members of the record values come from the library too.
+    Rect2<int32_t> rect;
+    rect.fromJson(data.faceRect().toJson());
+    EXPECT_EQ(rect, data.faceRect());
+    EXPECT_THROW(rect.fromJson("[1,2,3]"), JsonError);
 }
 
 TEST(SharedLibraryHost, EntriesWithoutSessionReportNoFace) {

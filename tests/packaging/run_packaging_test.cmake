@@ -1,0 +1,99 @@
+# Installs the build into a scratch prefix and proves the install usable:
+#  (a) docs/examples/c-host through `pkg-config --cflags --libs quorinapi`,
+#  (b) docs/examples/cpp-host through find_package(quorinapi),
+# each built against the installed files only and run on a real photo.
+# Without the data cache both run on a plain frame and the test reports a skip.
+cmake_minimum_required(VERSION 3.16)
+
+set(prefix ${WORK_DIR}/prefix)
+file(REMOVE_RECURSE ${WORK_DIR})
+file(MAKE_DIRECTORY ${WORK_DIR})
+
+function(run what)
+  cmake_parse_arguments(A "" "OUTPUT" "COMMAND" ${ARGN})
+  execute_process(COMMAND ${A_COMMAND} RESULT_VARIABLE rc OUTPUT_VARIABLE out ERROR_VARIABLE err)
+  if(NOT rc EQUAL 0)
+    string(REPLACE ";" " " line "${A_COMMAND}")
+    message(FATAL_ERROR "${what} failed (${rc}):\n  ${line}\n${out}\n${err}")
+  endif()
+  if(A_OUTPUT)
+    set(${A_OUTPUT} "${out}" PARENT_SCOPE)
+  endif()
+endfunction()
+
+# Hosts of a sanitized library must load the sanitizer runtime first.
+set(sanitize_flags "")
+if(SANITIZE)
+  set(sanitize_flags -fsanitize=address,undefined)
+endif()
+
+run("install" COMMAND ${CMAKE_COMMAND} --install ${BUILD_DIR} --prefix ${prefix})
+
+# The photo: tracking_faces.jpg of the data cache, three faces.
+set(data_dir "$ENV{QUORIN_DATA_DIR}")
+if(NOT data_dir)
+  set(data_dir "$ENV{HOME}/.cache/quorin")
+endif()
+set(photo ${data_dir}/photos/tracking_faces.jpg)
+set(photo_args "")
+set(expected_faces 0)
+if(EXISTS ${photo})
+  run("converting ${photo}" COMMAND ${PHOTO_TO_PGM} ${photo} ${WORK_DIR}/photo.pgm)
+  set(photo_args ${WORK_DIR}/photo.pgm)
+  set(expected_faces 3)
+endif()
+
+# (a) C through pkg-config.
+file(GLOB_RECURSE pc_files ${prefix}/*/quorinapi.pc)
+list(LENGTH pc_files pc_count)
+if(NOT pc_count EQUAL 1)
+  message(FATAL_ERROR "expected one installed quorinapi.pc under ${prefix}, found: ${pc_files}")
+endif()
+get_filename_component(pc_dir ${pc_files} DIRECTORY)
+set(pkg_config ${CMAKE_COMMAND} -E env PKG_CONFIG_PATH=${pc_dir} PKG_CONFIG_LIBDIR=${pc_dir} pkg-config)
+run("pkg-config" COMMAND ${pkg_config} --cflags --libs quorinapi OUTPUT flags)
+run("pkg-config libdir" COMMAND ${pkg_config} --variable=libdir quorinapi OUTPUT libdir)
+string(STRIP "${flags}" flags)
+string(STRIP "${libdir}" libdir)
+separate_arguments(flags UNIX_COMMAND "${flags}")
+if(NOT EXISTS ${libdir}/libquorinapi.so)
+  message(FATAL_ERROR "pkg-config names libdir ${libdir}, which holds no libquorinapi.so")
+endif()
+run("building the C host" COMMAND ${CC} -std=c99 -Wall -Wextra -pedantic -Werror ${sanitize_flags}
+  ${SOURCE_DIR}/docs/examples/c-host/detect_faces.c ${flags} -o ${WORK_DIR}/c-host)
+run("running the C host" COMMAND ${CMAKE_COMMAND} -E env LD_LIBRARY_PATH=${libdir}
+  ${WORK_DIR}/c-host ${photo_args} OUTPUT c_out)
+message("C host:\n${c_out}")
+
+# (b) C++ through find_package.
+set(cxx_flags "-Werror")
+if(SANITIZE)
+  set(cxx_flags "${cxx_flags} -fsanitize=address,undefined")
+endif()
+run("configuring the C++ host" COMMAND ${CMAKE_COMMAND} -S ${SOURCE_DIR}/docs/examples/cpp-host
+  -B ${WORK_DIR}/cpp-build -DCMAKE_PREFIX_PATH=${prefix} -DCMAKE_CXX_COMPILER=${CXX}
+  "-DCMAKE_CXX_FLAGS=${cxx_flags}" -DCMAKE_FIND_USE_PACKAGE_REGISTRY=OFF)
+run("building the C++ host" COMMAND ${CMAKE_COMMAND} --build ${WORK_DIR}/cpp-build)
+set(cpp_args ${photo_args})
+if(NOT cpp_args)
+  # A plain gray frame: no face, but a full run through the detector.
+  file(WRITE ${WORK_DIR}/plain.pgm "P5\n64 48\n255\n")
+  string(REPEAT "~" 3072 plain)
+  file(APPEND ${WORK_DIR}/plain.pgm "${plain}")
+  set(cpp_args ${WORK_DIR}/plain.pgm)
+endif()
+run("running the C++ host" COMMAND ${WORK_DIR}/cpp-build/detect_faces ${cpp_args} OUTPUT cpp_out)
+message("C++ host:\n${cpp_out}")
+
+# Both must report the photo's faces, each with a line.
+foreach(host c cpp)
+  string(REGEX MATCHALL "face [-0-9]+ [-0-9]+ [-0-9]+ [-0-9]+" lines "${${host}_out}")
+  list(LENGTH lines found)
+  if(NOT "${${host}_out}" MATCHES "^${expected_faces} faces\n" OR NOT found EQUAL expected_faces)
+    message(FATAL_ERROR "the ${host} host reported ${found} face lines, expected ${expected_faces}")
+  endif()
+endforeach()
+
+if(NOT photo_args)
+  message("SKIPPED: ${photo} not found (run scripts/fetch-data.sh); install, builds and plain-frame runs passed")
+endif()
