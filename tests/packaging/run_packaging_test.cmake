@@ -29,6 +29,26 @@ endif()
 
 run("install" COMMAND ${CMAKE_COMMAND} --install ${BUILD_DIR} --prefix ${prefix})
 
+# Version policy for 0.x: only the same minor version is compatible. Each entry
+# is a requested version and whether the installed 0.1.z must accept it.
+file(GLOB_RECURSE version_file ${prefix}/*/quorinapiConfigVersion.cmake)
+foreach(entry "0.1:TRUE" "0.1.0:TRUE" "0:FALSE" "0.0:FALSE" "0.2:FALSE" "1.0:FALSE")
+  string(REPLACE ":" ";" entry "${entry}")
+  list(GET entry 0 requested)
+  list(GET entry 1 expected)
+  string(REPLACE "." ";" parts "${requested}.0.0")
+  list(GET parts 0 PACKAGE_FIND_VERSION_MAJOR)
+  list(GET parts 1 PACKAGE_FIND_VERSION_MINOR)
+  list(GET parts 2 PACKAGE_FIND_VERSION_PATCH)
+  set(PACKAGE_FIND_VERSION ${requested})
+  set(PACKAGE_VERSION_COMPATIBLE FALSE)
+  include(${version_file})
+  if(NOT PACKAGE_VERSION_COMPATIBLE STREQUAL expected)
+    message(FATAL_ERROR "installed package ${PACKAGE_VERSION}: a request for ${requested} gives "
+      "compatible=${PACKAGE_VERSION_COMPATIBLE}, expected ${expected}")
+  endif()
+endforeach()
+
 # The photo: tracking_faces.jpg of the data cache, three faces.
 set(data_dir "$ENV{QUORIN_DATA_DIR}")
 if(NOT data_dir)
