@@ -4,12 +4,19 @@
 # declare the C interface are compiled as C too.
 #
 #   cmake -DCXX=<c++ compiler> -DCC=<c compiler> -DINCLUDE_DIR=<repo>/include
-#         -DWORK_DIR=<scratch dir> -P check_public_headers.cmake
+#         -DWORK_DIR=<scratch dir> [-DDEPENDENCY_INCLUDES=<dir;...>]
+#         -P check_public_headers.cmake
+# DEPENDENCY_INCLUDES are the headers of the libraries that the installed
+# package itself requires (Eigen), and nothing else.
 
 cmake_minimum_required(VERSION 3.16)
 
 set(c_headers quorinapi.h export.h)
 set(warnings -Wall -Wextra -pedantic -Werror)
+set(dependency_flags "")
+foreach(dir ${DEPENDENCY_INCLUDES})
+  list(APPEND dependency_flags -isystem ${dir})
+endforeach()
 
 file(GLOB headers RELATIVE ${INCLUDE_DIR}/quorin ${INCLUDE_DIR}/quorin/*.h)
 if(NOT headers)
@@ -24,7 +31,7 @@ foreach(header ${headers})
   # Twice, so that a missing include guard shows as a redefinition.
   file(WRITE ${WORK_DIR}/${stem}.cpp "#include <quorin/${header}>\n#include <quorin/${header}>\n")
   execute_process(
-    COMMAND ${CXX} -std=c++17 ${warnings} -fsyntax-only -I${INCLUDE_DIR} ${WORK_DIR}/${stem}.cpp
+    COMMAND ${CXX} -std=c++17 ${warnings} -fsyntax-only -I${INCLUDE_DIR} ${dependency_flags} ${WORK_DIR}/${stem}.cpp
     RESULT_VARIABLE rc OUTPUT_VARIABLE out ERROR_VARIABLE out)
   if(NOT rc EQUAL 0)
     list(APPEND failed "quorin/${header} (C++17)")
