@@ -15,6 +15,17 @@ const uint16_t kVersion = 1;
 // gigabytes costs no more memory than the bytes the stream really holds.
 const uint32_t kReadStep = 1u << 20;
 
+// A stream failure whose what() is the text alone: the library's own
+// ios_base::failure appends the error category's words to it.
+class StreamFailure : public std::ios_base::failure {
+public:
+    explicit StreamFailure(const char* text) : std::ios_base::failure(text), text_(text) {}
+    const char* what() const noexcept override { return text_; }
+
+private:
+    const char* text_;
+};
+
 }  // namespace
 
 // --- MemoryStream -----------------------------------------------------------
@@ -30,7 +41,7 @@ void MemoryStream::bind(const uint8_t* begin, const uint8_t* end) {
 }
 
 void MemoryStream::read(char* destination, unsigned int count) {
-    if (eof_) throw std::ios_base::failure("Read beyong stream");
+    if (eof_) throw StreamFailure("Read beyong stream");
     const std::size_t available = static_cast<std::size_t>(end_ - cursor_);
     lastCount_ = count;
     if (available < count) {
@@ -57,7 +68,7 @@ void MemoryStream::seekg(long long offset, std::ios_base::seekdir direction) {
         ok = offset >= -at && offset <= size - at;
         target = at + (ok ? offset : 0);
     }
-    if (!ok || size < 0) throw std::ios_base::failure("Stream position out of range");
+    if (!ok || size < 0) throw StreamFailure("Stream position out of range");
     cursor_ = begin_ + target;
 }
 
