@@ -10,6 +10,7 @@ PKGS=(
   opencv-data python3-opencv libopencv-objdetect-dev libopencv-imgproc-dev libopencv-imgcodecs-dev
   libdlib-dev libdlib-data
   ffmpeg nodejs npm opencv-doc
+  clang-14 libclang-rt-14-dev
 )
 missing=()
 for p in "${PKGS[@]}"; do

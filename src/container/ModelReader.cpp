@@ -6,9 +6,11 @@
 #include "core/Errors.h"
 #include "core/ModelRegistry.h"
 #include "core/ScrambledTexts.h"
+#include "quorin/QVIVBStream.h"
 
 namespace {
 const char* const kRawModeUnsupported = "The reader does not support raw mode loading";
+const char* const kIvbModeUnsupported = "The reader does not support ivb mode loading";
 }
 
 ModelReader::ModelReader(const std::string& path, int mode)
@@ -22,7 +24,12 @@ ModelReader::ModelReader(const std::string& path, int mode)
     if (!ModelRegistry::instance().findModel(parsed.first, begin, end))
         throw qv_data_error(descrambleText(scrambled::kModelNotFound));
 
-    if (mode == IVB) throw qv_unsupported_error("IVB model containers are not supported by this reader");
+    if (mode == IVB) {
+        // The reader owns only the parser; the bytes stay the registry's.
+        ivb_.reset(new QVIVBMemoryReader(begin, end));
+        mode_ = IVB;
+        return;
+    }
 
     if (end < begin || end - begin < 4) throw qv_data_error("Model data truncated");
     mode_ = mode;
@@ -59,6 +66,12 @@ unsigned int ModelReader::read(void* destination, unsigned int size, unsigned in
     }
     source_ += n;
     return count;
+}
+
+std::vector<uint8_t> ModelReader::readObject() {
+    if (mode_ != IVB) throw qv_unsupported_error(kIvbModeUnsupported);
+    if (!objectName_.empty()) return ivb_->readNamedObject(objectName_);
+    return ivb_->readNextObject();
 }
 
 unsigned int ModelReader::rawSize() const {

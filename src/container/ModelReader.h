@@ -2,22 +2,28 @@
 #define QUORIN_CONTAINER_MODELREADER_H
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <utility>
+#include <vector>
+
+class QVIVBMemoryReader;
 
 // The one way to model bytes. A path "model" or "model::object" resolves
 // through ModelRegistry to a built-in byte range. In raw mode the range is
 // 4 seed bytes (key = their XOR) then the payload, whose byte p is stored
 // XORed with the key and with low8((p % 256)^2); read() hands the payload out
-// plain, in order, single pass.
+// plain, in order, single pass. In IVB mode the range is an IVB stream and
+// readObject() hands out its objects whole, by the name behind "::" or in order.
 class ModelReader {
 public:
     enum Mode { IVB = 0, RAW = 1 };
 
     // Throws qv_data_error for an empty model path ("Invalid model path"), an
-    // unknown model, or a range too short for the seed; qv_unsupported_error
-    // for IVB mode, which this build does not serve. Any mode other than 0
-    // is accepted and kept as given, but only RAW can read.
+    // unknown model, or a raw range too short for the seed. In IVB mode the
+    // stream header is read at once: qv_data_error "Not a valid QV IVB file"
+    // (or std::ios_base::failure "Read beyong stream" for a cut label). Any
+    // mode other than 0 is raw and kept as given.
     ModelReader(const std::string& path, int mode);
     ~ModelReader();
 
@@ -36,12 +42,20 @@ public:
     // The whole payload's length (not what is left). Raw mode only.
     unsigned int rawSize() const;
 
+    // IVB mode: the main part of the object named by the path's "::" part, or,
+    // for a path without one, of the next object in the stream; empty when
+    // there is no such object or the stream is exhausted. Throws
+    // qv_unsupported_error "The reader does not support ivb mode loading" in
+    // raw mode, and the stream's errors on damaged bytes.
+    std::vector<uint8_t> readObject();
+
     int mode() const { return mode_; }
     const std::string& objectName() const { return objectName_; }
 
 private:
     int mode_;
-    const uint8_t* source_;  // read cursor in raw mode
+    const uint8_t* source_;                  // read cursor in raw mode
+    std::unique_ptr<QVIVBMemoryReader> ivb_;  // the stream in IVB mode
     std::string objectName_;
     uint32_t rawSize_;
     uint32_t key_;

@@ -8,6 +8,7 @@
 #include "core/Descramble.h"
 #include "core/Errors.h"
 #include "core/ScrambledTexts.h"
+#include "support/IvbGolden.h"
 #include "support/ScopedModel.h"
 #include "support/SourceTree.h"
 
@@ -115,12 +116,55 @@ TEST(ModelReaderPaths, ModelPathObjectNameAndFailures) {
 
 TEST(ModelReaderModes, OnlyRawModeReads) {
     ScopedModel model("moded", patternPayload(4));
-    EXPECT_THROW(ModelReader("moded", ModelReader::IVB), qv_unsupported_error);
+    // A raw model is no IVB stream.
+    expectMessage([&] { ModelReader r("moded", ModelReader::IVB); }, "Not a valid QV IVB file");
+    expectMessage([&] { ModelReader("moded", ModelReader::RAW).readObject(); },
+                  "The reader does not support ivb mode loading");
     // Other modes are kept as given but cannot read.
     ModelReader odd("moded", 5);
     uint8_t out[4];
     expectMessage([&] { odd.read(out, 1, 1); }, "The reader does not support raw mode loading");
     expectMessage([&] { odd.rawSize(); }, "The reader does not support raw mode loading");
+}
+
+TEST(ModelReaderIvb, ServesObjectsByNameOrInOrder) {
+    const std::vector<uint8_t> first = ivbgolden::compositeWithFloats();
+    const std::vector<uint8_t> second = ivbgolden::emptyComposite();
+    std::vector<uint8_t> stream = ivbgolden::hex("49 56 42 40 51 56 01 00 00 00 00 00 49 49 00 00");
+    for (const auto& object : {std::make_pair(std::string("floats"), first), std::make_pair(std::string("x"), second)}) {
+        stream.push_back(static_cast<uint8_t>(object.first.size()));
+        stream.insert(stream.end(), {0, 0, 0});
+        stream.insert(stream.end(), object.first.begin(), object.first.end());
+        stream.insert(stream.end(), object.second.begin(), object.second.end());
+    }
+    stream.insert(stream.end(), {0, 0, 0xFF, 0xFF});
+    ScopedModel model = ScopedModel::raw("ivbmodel", stream);
+
+    ModelReader walk("dir/ivbmodel", ModelReader::IVB);
+    EXPECT_EQ(walk.readObject(), first);
+    EXPECT_EQ(walk.readObject(), second);
+    EXPECT_TRUE(walk.readObject().empty());
+    EXPECT_TRUE(walk.readObject().empty());
+    expectMessage([&] { walk.rawSize(); }, "The reader does not support raw mode loading");
+    uint8_t out[1];
+    expectMessage([&] { walk.read(out, 1, 1); }, "The reader does not support raw mode loading");
+
+    ModelReader named("ivbmodel::x", ModelReader::IVB);
+    EXPECT_EQ(named.readObject(), second);
+    EXPECT_EQ(named.readObject(), second);  // every call searches from the top
+    EXPECT_TRUE(ModelReader("ivbmodel::nothing", ModelReader::IVB).readObject().empty());
+
+    // Every cut of the stream: a clear error at construction or at a read.
+    for (std::size_t n = 0; n + 1 < stream.size(); ++n) {
+        ScopedModel cut = ScopedModel::raw("ivbcut", std::vector<uint8_t>(stream.begin(), stream.begin() + n));
+        try {
+            ModelReader reader("ivbcut", ModelReader::IVB);
+            for (int i = 0; i < 3; ++i) reader.readObject();
+            ADD_FAILURE() << n;
+        } catch (const qv_data_error&) {
+        } catch (const std::ios_base::failure&) {
+        }
+    }
 }
 
 TEST(ModelPackingTool, PackerOutputReadsBackAndMatchesTheHeaderPacker) {
