@@ -55,8 +55,8 @@ inline Gray faceCrop(int side)
     return crop;
 }
 
-// A textured background with the face pasted with its top-left corner at (x, y).
-inline std::vector<uint8_t> frameWithFace(const Gray& face, int width, int height, int x, int y)
+// A textured background of width x height.
+inline std::vector<uint8_t> background(int width, int height)
 {
     std::vector<uint8_t> px(size_t(width) * size_t(height));
     for (int r = 0; r < height; ++r)
@@ -64,6 +64,20 @@ inline std::vector<uint8_t> frameWithFace(const Gray& face, int width, int heigh
             const double v = 120.0 + 50.0 * std::sin(c * 0.21) * std::cos(r * 0.13) + ((c * 7 + r * 13) % 17) * 2.0;
             px[size_t(r * width + c)] = uint8_t(v);
         }
+    return px;
+}
+
+// The background with the face pasted with its top-left corner at (x, y).
+inline std::vector<uint8_t> frameWithFace(const Gray& face, int width, int height, int x, int y)
+{
+    static std::vector<uint8_t> cached;
+    static int cachedWidth = 0, cachedHeight = 0;
+    if (cachedWidth != width || cachedHeight != height) {
+        cached = background(width, height);
+        cachedWidth = width;
+        cachedHeight = height;
+    }
+    std::vector<uint8_t> px = cached;
     for (int r = 0; r < face.height; ++r)
         for (int c = 0; c < face.width; ++c) {
             const int fx = x + c, fy = y + r;
