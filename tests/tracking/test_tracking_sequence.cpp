@@ -19,7 +19,8 @@
 #include "tracking/ParticleRandom.h"
 
 #if defined(__SANITIZE_ADDRESS__)
-#include <sanitizer/allocator_interface.h>
+// From the sanitizer runtime; its header doesn't come with every compiler.
+extern "C" size_t __sanitizer_get_current_allocated_bytes();
 #endif
 
 namespace {
