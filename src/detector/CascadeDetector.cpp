@@ -357,13 +357,9 @@ void CascadeDetector::getFeature(IN_IMAGE const& image, DetectionWindow const& w
 {
     if (count < 1)
         return;
-    const int W = image.pixelWidth();
-    const int H = image.pixelHeight();
-    if (!(window.left > 0 && window.top > 0 && window.right < W && window.bottom < H))
-        throw qv_invalid_argument("Feature window lies outside the image");
+    if (!featureWindowFits(image, window))
+        throw qv_invalid_argument("Feature window lies outside the image or the detector's scales");
     const int scale = std::min(scaleForSize(window.height()), scaleForSize(window.width()));
-    if (!hasFeatures(scale))
-        throw qv_invalid_argument("Feature window size is outside the detector's scales");
     // Offsets of another width would read the wrong pixels or past the image.
     ensurePrepared(image);
     const float inverseDeviation = image.ComputeNorm(window);
@@ -371,6 +367,20 @@ void CascadeDetector::getFeature(IN_IMAGE const& image, DetectionWindow const& w
     std::vector<WindowFeature> const& features = commonFeatures[scale];
     for (unsigned i = 0; i < count; ++i)
         values.at(i) = features.at(i).Eval(image, inverseDeviation, offset);
+}
+
+bool CascadeDetector::featureWindowFits(IN_IMAGE const& image, DetectionWindow const& window) const
+{
+    // The integral has one more row and column than the image, so a window may
+    // reach the last pixel; the trackers' observers test their own, tighter
+    // bounds before asking.
+    const int W = image.pixelWidth();
+    const int H = image.pixelHeight();
+    if (!(window.left >= 0 && window.top >= 0 && window.right <= W && window.bottom <= H))
+        return false;
+    if (window.right <= window.left || window.bottom <= window.top)
+        return false;
+    return hasFeatures(std::min(scaleForSize(window.height()), scaleForSize(window.width())));
 }
 
 bool CascadeDetector::spreadSearch(IN_IMAGE const& image, DetectionWindow const& window,

@@ -56,12 +56,16 @@ public:
     // Score of one window at the scale of its size, accepted or not; -20 for
     // a window not strictly inside the image or of a size no scale serves.
     float getScore(IN_IMAGE const& image, DetectionWindow const& window);
-    // The first `count` common-stage feature values of a window. Requires a
-    // search on an image of the same width before. Raises std::out_of_range
-    // for a short `values`, qv_invalid_argument for a window not strictly
-    // inside the image or of a size no scale serves.
+    // The first `count` common-stage feature values of a window. Prepares
+    // offsets for the image's width when needed. Raises std::out_of_range for
+    // a short `values`, qv_invalid_argument for a window that
+    // featureWindowFits refuses.
     void getFeature(IN_IMAGE const& image, DetectionWindow const& window, unsigned count,
                     std::vector<float>& values);
+    // True when getFeature can read `window`: not empty, inside the image's
+    // integral (an edge on the first or last row or column is allowed), and of
+    // a size whose scale has features.
+    bool featureWindowFits(IN_IMAGE const& image, DetectionWindow const& window) const;
 
     // One face near `window`: nearest scale first, then alternately larger and
     // smaller, inside a scale from the center outward; stops at the first hit.

@@ -10,6 +10,8 @@
 #include "image/IntegralImage.h"
 #include "postfilter/PostFilter.h"
 #include "postfilter/PostFilterFactory.h"
+#include "tracking/CPFTracker.h"
+#include "tracking/PFTracker.h"
 #include "tracking/Tracker.h"
 #include "tracking/TrackerFactory.h"
 
@@ -138,9 +140,17 @@ void FaceDetector::setTrackingMode(QVFaceTrackingMode mode)
     tracker = nullptr;
     const char* description = trackerDescription(mode);
     if (description == nullptr) return;
-    // An unregistered name gives null: tracking simply stays off. The particle
-    // trackers would be wired to the cascade here once they are registered.
+    // An unregistered name gives null: tracking simply stays off.
     tracker = TrackerFactory::instance().createInstance(description);
+    // The particle trackers weigh their clouds with this cascade, which
+    // outlives them (release destroys the tracker with it).
+    if (PFTracker* pf = dynamic_cast<PFTracker*>(tracker)) {
+        FaceEstimation estimation;
+        estimation.setDetector(detector);
+        pf->setEstimator(estimation);
+    } else if (CPFTracker* cpf = dynamic_cast<CPFTracker*>(tracker)) {
+        if (detector != nullptr) cpf->setDetector(*detector);
+    }
 }
 
 void FaceDetector::setSearchStep(float stepX, float stepY)

@@ -149,15 +149,4 @@ void KFTracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& dete
 
 std::string KFTracker::name() const { return "KF_TRACKER"; }
 
-Tracker* KFTracker::create(const std::string& parameters)
-{
-    Tracker* t = nullptr;
-    try {
-        t = new KFTracker();
-        t->fromJson(parameters);
-    } catch (const std::exception&) {
-        delete t;
-        return nullptr;
-    }
-    return t;
-}
+Tracker* KFTracker::create(const std::string& parameters) { return createAs<KFTracker>(parameters); }

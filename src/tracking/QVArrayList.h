@@ -1,6 +1,7 @@
 #ifndef QUORIN_TRACKING_QVARRAYLIST_H
 #define QUORIN_TRACKING_QVARRAYLIST_H
 
+#include <cstddef>
 #include <cstdint>
 #include <vector>
 
@@ -47,6 +48,18 @@ public:
             return;
         alive[slot] = false;
         freeSlots.push_back(slot);
+    }
+
+    // Trackers that stack dead slots again every frame would grow freeSlots
+    // for as long as a slot stays dead. Past `limit` entries the oldest half
+    // goes: a frame pops at most one entry per new face, so only a frame with
+    // more than limit / 2 new faces could tell the difference.
+    void boundFreeSlots(size_t limit = 1024)
+    {
+        if (freeSlots.size() <= limit)
+            return;
+        const size_t keep = limit / 2;
+        freeSlots.erase(freeSlots.begin(), freeSlots.end() - std::ptrdiff_t(keep));
     }
 };
 

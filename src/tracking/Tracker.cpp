@@ -129,15 +129,4 @@ void Tracker::fromJson(const std::string&) {}
 
 std::string Tracker::name() const { return "SIMPLE_TRACKER"; }
 
-Tracker* Tracker::create(const std::string& parameters)
-{
-    Tracker* t = nullptr;
-    try {
-        t = new Tracker();
-        t->fromJson(parameters);
-    } catch (const std::exception&) {
-        delete t;
-        return nullptr;
-    }
-    return t;
-}
+Tracker* Tracker::create(const std::string& parameters) { return createAs<Tracker>(parameters); }

@@ -2,6 +2,7 @@
 #define QUORIN_TRACKING_TRACKER_H
 
 #include <cstdint>
+#include <exception>
 #include <string>
 #include <vector>
 
@@ -51,6 +52,22 @@ public:
     QVArrayList<TrackFace> faces;
 
 protected:
+    // The body of every tracker's create: null when construction or fromJson
+    // throws a standard exception.
+    template <typename T>
+    static Tracker* createAs(const std::string& parameters)
+    {
+        Tracker* t = nullptr;
+        try {
+            t = new T();
+            t->fromJson(parameters);
+        } catch (const std::exception&) {
+            delete t;
+            return nullptr;
+        }
+        return t;
+    }
+
     // Overlap below this is no evidence of the same face.
     static constexpr double kMinOverlap = 0.3;
 };

@@ -1,6 +1,8 @@
 #include "tracking/TrackerFactory.h"
 
+#include "tracking/CPFTracker.h"
 #include "tracking/KFTracker.h"
+#include "tracking/PFTracker.h"
 
 TrackerFactory::TrackerFactory() { init(); }
 
@@ -12,8 +14,8 @@ TrackerFactory& TrackerFactory::instance()
 
 void TrackerFactory::init()
 {
-    // The particle-filter trackers are not built in; their names stay
-    // unregistered so that asking for them yields null.
     creators["SIMPLE_TRACKER"] = &Tracker::create;
     creators["KF_TRACKER"] = &KFTracker::create;
+    creators["PF_TRACKER"] = &PFTracker::create;
+    creators["CPF_TRACKER"] = &CPFTracker::create;
 }

@@ -390,7 +390,14 @@ TEST(CascadeSingleWindow, FeatureValuesAreTheCommonStagesInputs)
     std::vector<float> shortList(2), many(20);
     EXPECT_THROW(s.det.getFeature(in, makeWindow(40, 40, 64, 64), 3, shortList), std::out_of_range);
     EXPECT_THROW(s.det.getFeature(in, makeWindow(40, 40, 64, 64), 20, many), std::out_of_range);
-    EXPECT_THROW(s.det.getFeature(in, makeWindow(0, 40, 24, 64), 2, values), qv_invalid_argument);
+    // The integral's zero row and column make the first row and column
+    // readable; a window that leaves the image or is empty is refused.
+    EXPECT_NO_THROW(s.det.getFeature(in, makeWindow(0, 0, 24, 24), 2, values));
+    EXPECT_TRUE(s.det.featureWindowFits(in, makeWindow(0, 0, 24, 24)));
+    for (const DetectionWindow& w : {makeWindow(-1, 40, 23, 64), makeWindow(40, -1, 64, 23), makeWindow(40, 40, 40, 64)}) {
+        EXPECT_FALSE(s.det.featureWindowFits(in, w));
+        EXPECT_THROW(s.det.getFeature(in, w, 2, values), qv_invalid_argument);
+    }
 }
 
 namespace {

@@ -1,0 +1,59 @@
+#include "tracking/CPFTracker.h"
+
+#include "core/Errors.h"
+#include "tracking/ParticleRandom.h"
+
+CPFTracker::CPFTracker() { particle_random::reseed(); }
+
+void CPFTracker::predict(const IN_IMAGE& image, std::vector<DetectionWindow>* out)
+{
+    // Windows of slots that arise here stay empty until a predict writes them.
+    lastPredicted.resize(cascades.size(), DetectionWindow{});
+    for (size_t i = 0; i < cascades.size(); ++i) {
+        if (!cascades.alive[i]) continue;
+        DetectionWindow w{};
+        if (cascades.items[i].predict(image, &w) == 0) continue;
+        if (out) out->push_back(w);
+        lastPredicted[i] = w;
+    }
+}
+
+void CPFTracker::update(const IN_IMAGE& image, const std::vector<DetectionWindow>& detections)
+{
+    const size_t n = lastPredicted.size();
+    const size_t m = detections.size();
+
+    std::vector<std::vector<float>> scores(m, std::vector<float>(n, 0.0f));
+    for (size_t j = 0; j < n; ++j) {
+        if (!cascades.isAlive(j)) continue;
+        for (size_t i = 0; i < m; ++i) scores[i][j] = detections[i].Overlap(lastPredicted[j]);
+    }
+
+    std::vector<int> assignment;
+    match(scores, &assignment);
+
+    std::vector<bool> seen(n + m, false);
+    for (size_t i = 0; i < m; ++i) {
+        int j = i < assignment.size() ? assignment[i] : -1;
+        if (j < 0) {
+            if (detector == nullptr)
+                throw qv_operation_error("Cascade particle filter tracker doesn't have a detector yet");
+            CascadePF fresh;
+            fresh.init(*detector);
+            j = int(cascades.insert(fresh));
+        }
+        if (size_t(j) < seen.size()) seen[size_t(j)] = true;
+        cascades.items[size_t(j)].update(image, detections[i]);
+    }
+
+    // As in the simple tracker, dead slots are stacked again every frame.
+    for (size_t j = 0; j < cascades.size(); ++j)
+        if (j >= seen.size() || !seen[j]) cascades.remove(uint32_t(j));
+    cascades.boundFreeSlots();
+
+    ++frameCounter;
+}
+
+std::string CPFTracker::name() const { return "CPF_TRACKER"; }
+
+Tracker* CPFTracker::create(const std::string& parameters) { return createAs<CPFTracker>(parameters); }
