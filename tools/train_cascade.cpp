@@ -559,6 +559,11 @@ void positiveSamples(std::vector<FaceRow> const& rows, TrainConfig const& cfg, d
 
 struct Miner {
     std::vector<Gray> images;
+    // Face photos with their face: hits that overlap the face but don't frame
+    // it (parts of it, too large, turned) are negatives too; hits elsewhere are
+    // left alone, as a photo may hold unlabelled faces.
+    std::vector<Gray> facePhotos;
+    std::vector<Box> faceBoxes;
     std::string modelName = "cascade_in_training";
 
     // Raw hits of the engine's search with the partial cascade on random
@@ -573,7 +578,7 @@ struct Miner {
         for (int t = 0; t < threads; ++t)
             detectors.push_back(std::make_unique<CascadeDetector>(config));
         std::mt19937_64 rng(seed);
-        const size_t batch = 8, maxVariants = 4000;
+        const size_t batch = 8, maxVariants = 2000;
         const size_t perVariant = std::max<size_t>(8, wanted / 150);
         size_t variants = 0;
         *windowsSearched = 0;
@@ -589,15 +594,34 @@ struct Miner {
             for (size_t b = 0; b < batch; ++b) {
                 static const int sides[] = {160, 200, 240, 320, 400, 480, 640, 800, 1024};
                 static const float steps[] = {0.05f, 0.1f, 0.15f};
-                vs.push_back({static_cast<size_t>(rng() % images.size()), static_cast<int>(rng() % 4),
-                              sides[rng() % 9], (rng() & 1) != 0, steps[rng() % 3], rng()});
+                const bool onFace = !facePhotos.empty() && rng() % 10 < 3;
+                const size_t count = onFace ? facePhotos.size() : images.size();
+                vs.push_back({static_cast<size_t>(rng() % count) + (onFace ? images.size() : 0),
+                              static_cast<int>(rng() % 4), sides[rng() % 9], (rng() & 1) != 0, steps[rng() % 3], rng()});
             }
             std::vector<SampleSet> found(batch);
             std::vector<size_t> searched(batch, 0);
             auto work = [&](int t) {
                 for (size_t b = static_cast<size_t>(t); b < batch; b += static_cast<size_t>(threads)) {
                     Variant const& v = vs[b];
-                    const Gray g = shrunk(turned(images[v.image], v.quarters, v.mirror), v.longSide);
+                    const bool onFace = v.image >= images.size();
+                    Gray const& source = onFace ? facePhotos[v.image - images.size()] : images[v.image];
+                    const Gray g = shrunk(turned(source, v.quarters, v.mirror), v.longSide);
+                    Box face;
+                    if (onFace) {
+                        face = faceBoxes[v.image - images.size()];
+                        if (v.mirror)
+                            face.cx = source.width - face.cx;
+                        int h = source.height;
+                        for (int q = 0; q < v.quarters; ++q) {
+                            const double x = face.cx;
+                            face.cx = h - face.cy;
+                            face.cy = x;
+                            h = (q % 2 == 0) ? source.width : source.height;
+                        }
+                        const double f = static_cast<double>(g.width) / (v.quarters % 2 ? source.height : source.width);
+                        face = {face.cx * f, face.cy * f, face.side * f};
+                    }
                     const int minSide = std::min(g.width, g.height);
                     if (minSide < 32)
                         continue;
@@ -620,6 +644,13 @@ struct Miner {
                     uint8_t patch[kPatch * kPatch];
                     for (size_t k = 0; k < hits.size() && found[b].size() < perVariant; ++k) {
                         DetectionWindow const& w = hits[k].window;
+                        if (onFace) {
+                            const Box hit{(w.left + w.right) / 2.0, (w.top + w.bottom) / 2.0,
+                                          static_cast<double>(w.right - w.left)};
+                            const double overlap = iou(hit, face);
+                            if (overlap <= 0.0 || (v.quarters == 0 && overlap >= 0.4))
+                                continue;
+                        }
                         float inv = 0;
                         if (sampleOf(image, g, w.left, w.top, w.right - w.left, false, patch, &inv))
                             found[b].add(patch, inv);
@@ -677,7 +708,23 @@ int commandTrain(std::map<std::string, std::string> const& a)
         if (split == "train" && loadGray(path, g))
             miner.images.push_back(shrunk(g, 1024));
     }
-    say("%zu training faces, %zu face-free images", train.size(), miner.images.size());
+    for (size_t i = 0; i < train.size() && miner.facePhotos.size() < 2000; i += 4) {
+        Gray g;
+        if (train[i].source != "dev" && loadGray(train[i].path, g)) {
+            miner.facePhotos.push_back(std::move(g));
+            miner.faceBoxes.push_back(train[i].box);
+        }
+    }
+    say("%zu training faces, %zu face-free images, %zu face photos for misframed windows", train.size(),
+        miner.images.size(), miner.facePhotos.size());
+    // a fixed spread of the training faces when fewer are asked for
+    const size_t maxFaces = static_cast<size_t>(std::atoi(get(a, "--faces", "100000").c_str()));
+    if (train.size() > maxFaces) {
+        std::vector<FaceRow> spread;
+        for (size_t i = 0; i < maxFaces; ++i)
+            spread.push_back(train[i * train.size() / maxFaces]);
+        train.swap(spread);
+    }
     SampleSet tight, wide;
     positiveSamples(train, cfg, 0.5, cfg.seed, tight);
     positiveSamples(train, cfg, 1.5, cfg.seed + 1, wide);
@@ -686,7 +733,8 @@ int commandTrain(std::map<std::string, std::string> const& a)
     Cascade cascade;
     if (cascade.load(work + "/cascade.txt"))
         say("resuming after stage %zu", cascade.stages.size());
-    FeaturePool pool(1, 1, 0.1f, 1.25f);
+    // cells from 2 pixels, grown by a quarter and shifted by a quarter of a cell
+    FeaturePool pool(2, 2, 0.25f, 1.25f);
     say("feature pool: %zu", pool.size());
     while (static_cast<int>(cascade.stages.size()) < cfg.maxStages) {
         const size_t k = cascade.stages.size();
@@ -880,7 +928,15 @@ int commandMeasure(std::map<std::string, std::string> const& a)
                     any = found(detectBoxes(photos[i]), chosen[i].box);
                 hits += any;
             } else {
-                hits += found(detectBoxes(photos[i]), chosen[i].box);
+                const std::vector<Box> boxes = detectBoxes(photos[i]);
+                hits += found(boxes, chosen[i].box);
+                if (std::getenv("MEASURE_VERBOSE") != nullptr && i < 5) {
+                    std::printf("  %s truth %.0f %.0f %.0f:", chosen[i].path.c_str(), chosen[i].box.cx, chosen[i].box.cy,
+                                chosen[i].box.side);
+                    for (Box const& b : boxes)
+                        std::printf(" [%.0f %.0f %.0f]", b.cx, b.cy, b.side);
+                    std::printf("\n");
+                }
             }
         }
         for (Gray const& g : freeImages) {
