@@ -1,0 +1,1051 @@
+// train_cascade: trains our frontal face cascade for the engine's search grid,
+// and measures it against the built-in one.
+//
+//   train_cascade boxes   --faces DIR --five TSV --dev DIR --split JSON --out TSV
+//       Face boxes in the built-in cascade's framing: runs that cascade (mode 2
+//       settings, merged hits) on the face photos, fits one mapping from five
+//       points to its boxes (one for human points, one for the teacher's), and
+//       applies it to every photo. Splits people by a fixed hash of the
+//       identity: 15% go to the report split and are never trained on.
+//   train_cascade train   --boxes TSV --negatives LIST --work DIR [--stages N]
+//       Boosts stages into WORK/cascade.txt (state) and WORK/model.bin (the
+//       engine payload), mining negatives with the engine's own search against
+//       the partial cascade. Resumes after the last finished stage.
+//   train_cascade measure --boxes TSV --negatives LIST [--model FILE] [--limit N]
+//       Faces found and false hits per face-free image through the public
+//       entries in modes 0, 1 and 2, the orientation search on turned photos,
+//       and features evaluated per window; --model serves FILE as "mdcb".
+//
+// Lists: the negatives list has one image path and "train" or "report" per
+// line (tab separated). Deterministic for a given --seed.
+
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <cmath>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <iostream>
+#include <map>
+#include <memory>
+#include <random>
+#include <sstream>
+#include <string>
+#include <thread>
+#include <vector>
+
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wmissing-field-initializers"
+#pragma GCC diagnostic ignored "-Wsign-compare"
+#pragma GCC diagnostic ignored "-Wunused-function"
+#pragma GCC diagnostic ignored "-Wunused-but-set-variable"
+#define STB_IMAGE_IMPLEMENTATION
+#define STBI_NO_HDR
+#include <stb/stb_image.h>
+#pragma GCC diagnostic pop
+
+#include "CascadeTrainer.h"
+#include "ModelPacking.h"
+#include "api/FrameOps.h"
+#include "core/ModelRegistry.h"
+#include "detector/CascadeDetector.h"
+#include "detector/WindowMerger.h"
+#include "image/IntegralImage.h"
+#include "quorin/quorinapi.h"
+
+using namespace cascadetrain;
+
+namespace {
+
+struct Gray {
+    std::vector<uint8_t> pixels;
+    int width = 0, height = 0;
+};
+
+bool loadGray(std::string const& path, Gray& g)
+{
+    int w = 0, h = 0, c = 0;
+    unsigned char* p = stbi_load(path.c_str(), &w, &h, &c, 1);
+    if (p == nullptr)
+        return false;
+    g.pixels.assign(p, p + static_cast<size_t>(w) * h);
+    g.width = w;
+    g.height = h;
+    stbi_image_free(p);
+    return true;
+}
+
+Gray turned(Gray const& in, int quarters, bool mirror)
+{
+    Gray f = in;
+    if (mirror)
+        for (int y = 0; y < f.height; ++y)
+            std::reverse(f.pixels.begin() + static_cast<std::ptrdiff_t>(y) * f.width,
+                         f.pixels.begin() + static_cast<std::ptrdiff_t>(y + 1) * f.width);
+    for (int q = 0; q < quarters; ++q) {
+        Gray t;
+        t.width = f.height;
+        t.height = f.width;
+        t.pixels.resize(f.pixels.size());
+        for (int y = 0; y < f.height; ++y)
+            for (int x = 0; x < f.width; ++x)
+                t.pixels[static_cast<size_t>(x) * t.width + (f.height - 1 - y)] = f.pixels[static_cast<size_t>(y) * f.width + x];
+        f = std::move(t);
+    }
+    return f;
+}
+
+// Nearest-neighbour shrink to a long side, as the detect entries make work frames.
+Gray shrunk(Gray const& in, int longSide)
+{
+    if (std::max(in.width, in.height) <= longSide)
+        return in;
+    const float s = static_cast<float>(longSide) / static_cast<float>(std::max(in.width, in.height));
+    Gray out;
+    out.width = std::max(1, static_cast<int>(s * static_cast<float>(in.width)));
+    out.height = std::max(1, static_cast<int>(s * static_cast<float>(in.height)));
+    out.pixels.resize(static_cast<size_t>(out.width) * out.height);
+    resizeNearest(in.pixels.data(), in.width, in.height, out.pixels.data(), out.width, out.height);
+    return out;
+}
+
+struct Box {
+    double cx = 0, cy = 0, side = 0;
+    double left() const { return cx - side / 2; }
+    double top() const { return cy - side / 2; }
+};
+
+double iou(double al, double at, double ar, double ab, double bl, double bt, double br, double bb)
+{
+    const double w = std::min(ar, br) - std::max(al, bl), h = std::min(ab, bb) - std::max(at, bt);
+    if (w <= 0 || h <= 0)
+        return 0;
+    return w * h / ((ar - al) * (ab - at) + (br - bl) * (bb - bt) - w * h);
+}
+
+double iou(Box const& a, Box const& b)
+{
+    return iou(a.left(), a.top(), a.left() + a.side, a.top() + a.side, b.left(), b.top(), b.left() + b.side,
+               b.top() + b.side);
+}
+
+uint32_t fnv1a(std::string const& s)
+{
+    uint32_t h = 2166136261u;
+    for (unsigned char c : s) {
+        h ^= c;
+        h *= 16777619u;
+    }
+    return h;
+}
+
+bool reportIdentity(std::string const& identity) { return fnv1a(identity) % 100 < 15; }
+
+// ------------------------------------------------------------------ labels
+
+struct Five {
+    double x[5], y[5]; // leftEye, rightEye, nose, leftMouthCorner, rightMouthCorner
+};
+
+struct LabelledFace {
+    double rect[4];
+    Five five;
+};
+
+struct LabelledImage {
+    std::string image;
+    int width = 0, height = 0;
+    std::vector<LabelledFace> faces;
+};
+
+// Reads one line of the teacher labels (label_faces' JSON lines).
+bool parseLabels(std::string const& line, LabelledImage& out)
+{
+    const size_t at = line.find("\"image\":\"");
+    if (at == std::string::npos)
+        return false;
+    const size_t end = line.find('"', at + 9);
+    out.image = line.substr(at + 9, end - at - 9);
+    out.faces.clear();
+    std::sscanf(line.c_str() + line.find("\"width\":"), "\"width\":%d", &out.width);
+    std::sscanf(line.c_str() + line.find("\"height\":"), "\"height\":%d", &out.height);
+    for (size_t p = line.find("\"rect\":["); p != std::string::npos; p = line.find("\"rect\":[", p + 1)) {
+        LabelledFace f{};
+        if (std::sscanf(line.c_str() + p, "\"rect\":[%lf,%lf,%lf,%lf]", &f.rect[0], &f.rect[1], &f.rect[2], &f.rect[3]) != 4)
+            continue;
+        const size_t q = line.find("\"points\":[", p);
+        if (q == std::string::npos)
+            continue;
+        std::vector<double> v;
+        const char* c = line.c_str() + q + 10;
+        while (v.size() < 136) {
+            while (*c == '[' || *c == ',' || *c == ' ')
+                ++c;
+            char* e = nullptr;
+            const double d = std::strtod(c, &e);
+            if (e == c)
+                break;
+            v.push_back(d);
+            c = e;
+            while (*c == ']')
+                ++c;
+        }
+        if (v.size() < 136)
+            continue;
+        auto px = [&](int i) { return v[2 * i]; };
+        auto py = [&](int i) { return v[2 * i + 1]; };
+        double lx = 0, ly = 0, rx = 0, ry = 0;
+        for (int i = 36; i < 42; ++i) {
+            lx += px(i) / 6;
+            ly += py(i) / 6;
+            rx += px(i + 6) / 6;
+            ry += py(i + 6) / 6;
+        }
+        f.five = {{lx, rx, px(30), px(48), px(54)}, {ly, ry, py(30), py(48), py(54)}};
+        out.faces.push_back(f);
+    }
+    return true;
+}
+
+// Box from five points: centre = E + p u + q v, side = r |u| + s iod, with E the
+// eye midpoint, u from E to the mouth midpoint and v = u turned to the image's right.
+struct Mapping {
+    double p = 0, q = 0, r = 0, s = 0;
+    Box apply(Five const& f) const
+    {
+        const double ex = (f.x[0] + f.x[1]) / 2, ey = (f.y[0] + f.y[1]) / 2;
+        const double ux = (f.x[3] + f.x[4]) / 2 - ex, uy = (f.y[3] + f.y[4]) / 2 - ey;
+        const double L = std::hypot(ux, uy), iod = std::hypot(f.x[1] - f.x[0], f.y[1] - f.y[0]);
+        return {ex + p * ux + q * uy, ey + p * uy - q * ux, r * L + s * iod};
+    }
+};
+
+Mapping fitMapping(std::vector<std::pair<Five, Box>> const& pairs)
+{
+    Mapping m;
+    std::vector<double> ps, qs;
+    double a11 = 0, a12 = 0, a22 = 0, b1 = 0, b2 = 0;
+    for (auto const& [f, b] : pairs) {
+        const double ex = (f.x[0] + f.x[1]) / 2, ey = (f.y[0] + f.y[1]) / 2;
+        const double ux = (f.x[3] + f.x[4]) / 2 - ex, uy = (f.y[3] + f.y[4]) / 2 - ey;
+        const double L2 = ux * ux + uy * uy;
+        if (L2 < 1)
+            continue;
+        const double dx = b.cx - ex, dy = b.cy - ey;
+        ps.push_back((dx * ux + dy * uy) / L2);
+        qs.push_back((dx * uy - dy * ux) / L2);
+        const double L = std::sqrt(L2), iod = std::hypot(f.x[1] - f.x[0], f.y[1] - f.y[0]);
+        a11 += L * L;
+        a12 += L * iod;
+        a22 += iod * iod;
+        b1 += L * b.side;
+        b2 += iod * b.side;
+    }
+    if (ps.empty())
+        return m;
+    auto median = [](std::vector<double> v) {
+        std::nth_element(v.begin(), v.begin() + static_cast<std::ptrdiff_t>(v.size() / 2), v.end());
+        return v[v.size() / 2];
+    };
+    m.p = median(ps);
+    m.q = median(qs);
+    const double det = a11 * a22 - a12 * a12;
+    m.r = (b1 * a22 - b2 * a12) / det;
+    m.s = (a11 * b2 - a12 * b1) / det;
+    return m;
+}
+
+// The built-in cascade's merged boxes with the settings of mode 2.
+std::vector<Box> builtinBoxes(CascadeDetector& cascade, Gray const& g)
+{
+    const Gray w = shrunk(g, 640);
+    const double back = static_cast<double>(g.width) / w.width;
+    const int minSide = std::min(w.width, w.height);
+    std::vector<Box> out;
+    if (minSide < 32)
+        return out;
+    cascade.setSearchStep(0.1f, 0.1f);
+    cascade.setFaceSizeRange(std::max(32, minSide / 8), minSide);
+    IN_IMAGE image;
+    if (!image.Init(w.width, w.height, w.width, w.pixels.data()))
+        return out;
+    DetectionWindow whole;
+    whole.left = 0;
+    whole.top = 0;
+    whole.right = w.width;
+    whole.bottom = w.height;
+    std::vector<ScoredWindow> raw, merged;
+    cascade.exhaustiveDetect(image, {whole}, &raw);
+    WindowMerger merger;
+    merger.mergeWindows(raw, merged);
+    for (ScoredWindow const& s : merged)
+        out.push_back({back * (s.window.left + s.window.right) / 2.0, back * (s.window.top + s.window.bottom) / 2.0,
+                       back * (s.window.right - s.window.left)});
+    return out;
+}
+
+std::map<std::string, std::string> args(int argc, char** argv, int from)
+{
+    std::map<std::string, std::string> a;
+    for (int i = from; i + 1 < argc; i += 2)
+        a[argv[i]] = argv[i + 1];
+    return a;
+}
+
+std::string get(std::map<std::string, std::string> const& a, std::string const& k, std::string const& dflt = "")
+{
+    auto it = a.find(k);
+    return it == a.end() ? dflt : it->second;
+}
+
+// Dev data split: "name": {"identity": ..., "split": ..., "kind": ...}.
+struct DevEntry {
+    std::string split, kind;
+};
+std::map<std::string, DevEntry> readSplit(std::string const& path)
+{
+    std::map<std::string, DevEntry> out;
+    std::ifstream in(path);
+    std::string line;
+    while (std::getline(in, line)) {
+        const size_t a = line.find('"'), b = line.find('"', a + 1);
+        const size_t s = line.find("\"split\": \"");
+        if (a == std::string::npos || b == std::string::npos || s == std::string::npos)
+            continue;
+        DevEntry e;
+        e.split = line.substr(s + 10, line.find('"', s + 10) - s - 10);
+        const size_t k = line.find("\"kind\": \"");
+        if (k != std::string::npos)
+            e.kind = line.substr(k + 9, line.find('"', k + 9) - k - 9);
+        out[line.substr(a + 1, b - a - 1)] = e;
+    }
+    return out;
+}
+
+int commandBoxes(std::map<std::string, std::string> const& a)
+{
+    const std::string faces = get(a, "--faces"), dev = get(a, "--dev"), out = get(a, "--out");
+    std::map<std::string, Five> human;
+    {
+        std::ifstream in(get(a, "--five"));
+        std::string line;
+        std::getline(in, line);
+        while (std::getline(in, line)) {
+            std::istringstream ls(line);
+            std::string file;
+            Five f{};
+            ls >> file;
+            for (int i = 0; i < 5; ++i)
+                ls >> f.x[i] >> f.y[i];
+            if (ls)
+                human["photos/" + file] = f;
+        }
+    }
+    struct Item {
+        std::string path, identity, split, source;
+        Five five;
+        bool humanPoints;
+    };
+    std::vector<Item> items;
+    {
+        std::ifstream in(faces + "/labels/faces.jsonl");
+        std::string line;
+        LabelledImage li;
+        while (std::getline(in, line)) {
+            if (!parseLabels(line, li) || li.faces.empty())
+                continue;
+            // the person named is the face nearest the centre
+            size_t best = 0;
+            double bestD = 1e30;
+            for (size_t i = 0; i < li.faces.size(); ++i) {
+                const double dx = (li.faces[i].rect[0] + li.faces[i].rect[2] - li.width) / 2;
+                const double dy = (li.faces[i].rect[1] + li.faces[i].rect[3] - li.height) / 2;
+                if (dx * dx + dy * dy < bestD) {
+                    bestD = dx * dx + dy * dy;
+                    best = i;
+                }
+            }
+            Item it;
+            it.path = faces + "/" + li.image;
+            const bool lfw = li.image.find("photos/lfw/") == 0;
+            it.source = lfw ? "lfw" : "congress";
+            if (lfw) {
+                const size_t s = std::string("photos/lfw/").size();
+                it.identity = "lfw/" + li.image.substr(s, li.image.find('/', s) - s);
+            } else {
+                it.identity = "congress/" + li.image.substr(li.image.rfind('/') + 1);
+            }
+            it.split = reportIdentity(it.identity) ? "report" : "train";
+            auto h = human.find(li.image);
+            it.humanPoints = h != human.end();
+            it.five = it.humanPoints ? h->second : li.faces[best].five;
+            items.push_back(it);
+        }
+    }
+    // dev data: every teacher face of the face photos and clip frames
+    const std::map<std::string, DevEntry> split = readSplit(get(a, "--split"));
+    {
+        std::ifstream in(dev + "/labels/faces.jsonl");
+        std::string line;
+        LabelledImage li;
+        while (std::getline(in, line)) {
+            if (!parseLabels(line, li))
+                continue;
+            std::string key;
+            if (li.image.rfind("photos/", 0) == 0)
+                key = li.image.substr(7);
+            else if (li.image.rfind("frames/", 0) == 0)
+                key = li.image.substr(7, li.image.find('/', 7) - 7);
+            else
+                continue;
+            auto e = split.find(key);
+            if (e == split.end() || e->second.kind != "face")
+                continue;
+            for (LabelledFace const& f : li.faces)
+                items.push_back({dev + "/" + li.image, "dev/" + key, e->second.split, "dev", f.five, false});
+        }
+    }
+    // fit on a sample of the many-identity photos where the built-in cascade finds the face
+    CascadeDetector cascade(R"({"model":"mdcb","imageMaxSize":640,"faceMinSize":32,"faceMaxSize":640})");
+    std::vector<std::pair<Five, Box>> pairsHuman, pairsTeacher;
+    size_t tried = 0;
+    for (size_t i = 0; i < items.size(); i += 3) {
+        if (items[i].source == "dev")
+            continue;
+        Gray g;
+        if (!loadGray(items[i].path, g))
+            continue;
+        ++tried;
+        const Box guess = Mapping{0.2, 0, 1.2, 0.9}.apply(items[i].five);
+        double bestIou = 0;
+        Box found;
+        for (Box const& b : builtinBoxes(cascade, g))
+            if (iou(b, guess) > bestIou) {
+                bestIou = iou(b, guess);
+                found = b;
+            }
+        if (bestIou >= 0.4)
+            (items[i].humanPoints ? pairsHuman : pairsTeacher).push_back({items[i].five, found});
+    }
+    Mapping mh = fitMapping(pairsHuman), mt = fitMapping(pairsTeacher);
+    // one refit with the guess replaced by the first fit, keeping close matches only
+    auto refit = [&](std::vector<std::pair<Five, Box>>& pairs, Mapping& m) {
+        std::vector<std::pair<Five, Box>> kept;
+        for (auto const& pb : pairs)
+            if (iou(m.apply(pb.first), pb.second) >= 0.6)
+                kept.push_back(pb);
+        m = fitMapping(kept);
+        return kept.size();
+    };
+    const size_t kh = refit(pairsHuman, mh), kt = refit(pairsTeacher, mt);
+    std::fprintf(stderr, "boxes: %zu photos tried; human points: %zu pairs (%zu kept) p %.4f q %.4f r %.4f s %.4f\n",
+                 tried, pairsHuman.size(), kh, mh.p, mh.q, mh.r, mh.s);
+    std::fprintf(stderr, "boxes: teacher points: %zu pairs (%zu kept) p %.4f q %.4f r %.4f s %.4f\n",
+                 pairsTeacher.size(), kt, mt.p, mt.q, mt.r, mt.s);
+    std::ofstream o(out);
+    o << "# path\tidentity\tsplit\tsource\tcx\tcy\tside\n";
+    for (Item const& it : items) {
+        const Box b = (it.humanPoints ? mh : mt).apply(it.five);
+        o << it.path << '\t' << it.identity << '\t' << it.split << '\t' << it.source << '\t' << b.cx << '\t' << b.cy
+          << '\t' << b.side << '\n';
+    }
+    std::fprintf(stderr, "boxes: %zu faces -> %s\n", items.size(), out.c_str());
+    return 0;
+}
+
+struct FaceRow {
+    std::string path, identity, split, source;
+    Box box;
+};
+
+std::vector<FaceRow> readBoxes(std::string const& path)
+{
+    std::vector<FaceRow> rows;
+    std::ifstream in(path);
+    std::string line;
+    while (std::getline(in, line)) {
+        if (line.empty() || line[0] == '#')
+            continue;
+        std::istringstream ls(line);
+        FaceRow r;
+        std::getline(ls, r.path, '\t');
+        std::getline(ls, r.identity, '\t');
+        std::getline(ls, r.split, '\t');
+        std::getline(ls, r.source, '\t');
+        ls >> r.box.cx >> r.box.cy >> r.box.side;
+        if (ls)
+            rows.push_back(r);
+    }
+    return rows;
+}
+
+std::vector<std::pair<std::string, std::string>> readList(std::string const& path)
+{
+    std::vector<std::pair<std::string, std::string>> out;
+    std::ifstream in(path);
+    std::string line;
+    while (std::getline(in, line)) {
+        const size_t t = line.find('\t');
+        if (t != std::string::npos)
+            out.push_back({line.substr(0, t), line.substr(t + 1)});
+    }
+    return out;
+}
+
+// ------------------------------------------------------------------ training
+
+// The inverse deviation the engine computes for a window, and the patch.
+bool sampleOf(IN_IMAGE const& image, Gray const& g, double left, double top, double side, bool mirror,
+              uint8_t* patch, float* inverseDeviation)
+{
+    DetectionWindow w;
+    w.left = static_cast<int>(std::lround(left));
+    w.top = static_cast<int>(std::lround(top));
+    const int s = static_cast<int>(std::lround(side));
+    w.right = w.left + s;
+    w.bottom = w.top + s;
+    if (w.left < 0 || w.top < 0 || w.right > g.width || w.bottom > g.height || s < 8)
+        return false;
+    if (!cutPatch(image.data, g.width, g.height, left, top, side, mirror, patch))
+        return false;
+    *inverseDeviation = image.ComputeNorm(w);
+    return *inverseDeviation < kGateInverseDeviation;
+}
+
+struct TrainConfig {
+    double step = 0.15;       // the coarse grid of modes 0 and 1
+    double scaleStep = 1.25;  // ratio between scales
+    int copies = 2;
+    int negatives = 8000;
+    int maxStages = 20;
+    uint64_t seed = 19;
+    int threads = 2;
+};
+
+void positiveSamples(std::vector<FaceRow> const& rows, TrainConfig const& cfg, double jitterSteps, uint64_t seed,
+                     SampleSet& out)
+{
+    std::mt19937_64 rng(seed);
+    std::uniform_real_distribution<double> u(-1.0, 1.0);
+    uint8_t patch[kPatch * kPatch];
+    std::string loaded;
+    Gray g;
+    std::unique_ptr<IN_IMAGE> image;
+    for (FaceRow const& r : rows) {
+        if (r.path != loaded) {
+            loaded = r.path;
+            image.reset();
+            if (!loadGray(r.path, g))
+                continue;
+            image = std::make_unique<IN_IMAGE>();
+            if (!image->Init(g.width, g.height, g.width, g.pixels.data())) {
+                image.reset();
+                continue;
+            }
+        }
+        if (!image)
+            continue;
+        for (int c = 0; c < cfg.copies; ++c) {
+            const double side = r.box.side * std::pow(cfg.scaleStep, 0.5 * u(rng));
+            const double dx = jitterSteps * cfg.step * side * u(rng), dy = jitterSteps * cfg.step * side * u(rng);
+            float inv = 0;
+            if (sampleOf(*image, g, r.box.cx + dx - side / 2, r.box.cy + dy - side / 2, side, c % 2 == 1, patch, &inv))
+                out.add(patch, inv);
+        }
+    }
+}
+
+struct Miner {
+    std::vector<Gray> images;
+    // Face photos with their face: hits that overlap the face but don't frame
+    // it (parts of it, too large, turned) are negatives too; hits elsewhere are
+    // left alone, as a photo may hold unlabelled faces.
+    std::vector<Gray> facePhotos;
+    std::vector<Box> faceBoxes;
+    std::string modelName = "cascade_in_training";
+
+    // Raw hits of the engine's search with the partial cascade on random
+    // variants of the images (size, step, turn, mirror), cut into samples.
+    size_t mine(std::vector<uint8_t> const& payload, size_t wanted, uint64_t seed, int threads, SampleSet& out,
+                size_t* windowsSearched)
+    {
+        const std::vector<uint8_t> packed = packRawModel(payload);
+        ModelRegistry::instance().registerModel(modelName, packed.data(), packed.data() + packed.size());
+        const std::string config = "{\"model\":\"" + modelName + R"(","imageMaxSize":1024,"faceMinSize":24,"faceMaxSize":1024})";
+        std::vector<std::unique_ptr<CascadeDetector>> detectors;
+        for (int t = 0; t < threads; ++t)
+            detectors.push_back(std::make_unique<CascadeDetector>(config));
+        std::mt19937_64 rng(seed);
+        const size_t batch = 8, maxVariants = 2000;
+        const size_t perVariant = std::max<size_t>(8, wanted / 150);
+        size_t variants = 0;
+        *windowsSearched = 0;
+        while (out.size() < wanted && variants < maxVariants) {
+            struct Variant {
+                size_t image;
+                int quarters, longSide;
+                bool mirror;
+                float step;
+                uint64_t seed;
+            };
+            std::vector<Variant> vs;
+            for (size_t b = 0; b < batch; ++b) {
+                static const int sides[] = {160, 200, 240, 320, 400, 480, 640, 800, 1024};
+                static const float steps[] = {0.05f, 0.1f, 0.15f};
+                const bool onFace = !facePhotos.empty() && rng() % 10 < 3;
+                const size_t count = onFace ? facePhotos.size() : images.size();
+                vs.push_back({static_cast<size_t>(rng() % count) + (onFace ? images.size() : 0),
+                              static_cast<int>(rng() % 4), sides[rng() % 9], (rng() & 1) != 0, steps[rng() % 3], rng()});
+            }
+            std::vector<SampleSet> found(batch);
+            std::vector<size_t> searched(batch, 0);
+            auto work = [&](int t) {
+                for (size_t b = static_cast<size_t>(t); b < batch; b += static_cast<size_t>(threads)) {
+                    Variant const& v = vs[b];
+                    const bool onFace = v.image >= images.size();
+                    Gray const& source = onFace ? facePhotos[v.image - images.size()] : images[v.image];
+                    const Gray g = shrunk(turned(source, v.quarters, v.mirror), v.longSide);
+                    Box face;
+                    if (onFace) {
+                        face = faceBoxes[v.image - images.size()];
+                        if (v.mirror)
+                            face.cx = source.width - face.cx;
+                        int h = source.height;
+                        for (int q = 0; q < v.quarters; ++q) {
+                            const double x = face.cx;
+                            face.cx = h - face.cy;
+                            face.cy = x;
+                            h = (q % 2 == 0) ? source.width : source.height;
+                        }
+                        const double f = static_cast<double>(g.width) / (v.quarters % 2 ? source.height : source.width);
+                        face = {face.cx * f, face.cy * f, face.side * f};
+                    }
+                    const int minSide = std::min(g.width, g.height);
+                    if (minSide < 32)
+                        continue;
+                    CascadeDetector& d = *detectors[static_cast<size_t>(t)];
+                    d.setSearchStep(v.step, v.step);
+                    d.setFaceSizeRange(24, minSide);
+                    IN_IMAGE image;
+                    if (!image.Init(g.width, g.height, g.width, g.pixels.data()))
+                        continue;
+                    DetectionWindow whole;
+                    whole.left = 0;
+                    whole.top = 0;
+                    whole.right = g.width;
+                    whole.bottom = g.height;
+                    std::vector<ScoredWindow> hits;
+                    d.exhaustiveDetect(image, {whole}, &hits);
+                    searched[b] = hits.size();
+                    std::mt19937_64 r(v.seed);
+                    std::shuffle(hits.begin(), hits.end(), r);
+                    uint8_t patch[kPatch * kPatch];
+                    for (size_t k = 0; k < hits.size() && found[b].size() < perVariant; ++k) {
+                        DetectionWindow const& w = hits[k].window;
+                        if (onFace) {
+                            const Box hit{(w.left + w.right) / 2.0, (w.top + w.bottom) / 2.0,
+                                          static_cast<double>(w.right - w.left)};
+                            const double overlap = iou(hit, face);
+                            if (overlap <= 0.0 || (v.quarters == 0 && overlap >= 0.4))
+                                continue;
+                        }
+                        float inv = 0;
+                        if (sampleOf(image, g, w.left, w.top, w.right - w.left, false, patch, &inv))
+                            found[b].add(patch, inv);
+                    }
+                }
+            };
+            std::vector<std::thread> ths;
+            for (int t = 1; t < threads; ++t)
+                ths.emplace_back(work, t);
+            work(0);
+            for (std::thread& th : ths)
+                th.join();
+            for (size_t b = 0; b < batch; ++b) {
+                *windowsSearched += searched[b];
+                for (size_t k = 0; k < found[b].size() && out.size() < wanted; ++k)
+                    out.addFrom(found[b], k);
+            }
+            variants += batch;
+        }
+        detectors.clear();
+        ModelRegistry::instance().unregisterModel(modelName);
+        return variants;
+    }
+};
+
+int commandTrain(std::map<std::string, std::string> const& a)
+{
+    TrainConfig cfg;
+    const std::string work = get(a, "--work");
+    cfg.maxStages = std::atoi(get(a, "--stages", "20").c_str());
+    cfg.negatives = std::atoi(get(a, "--negatives-per-stage", "8000").c_str());
+    cfg.seed = std::strtoull(get(a, "--seed", "19").c_str(), nullptr, 10);
+    const double minutes = std::atof(get(a, "--minutes", "1e9").c_str());
+    const double featureFraction = std::atof(get(a, "--feature-fraction", "0.015").c_str());
+    const auto start = std::chrono::steady_clock::now();
+    std::FILE* log = std::fopen((work + "/train.log").c_str(), "a");
+    auto say = [&](const char* fmt, auto... v) {
+        const double t = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+        for (std::FILE* f : {stderr, log}) {
+            if (f == nullptr)
+                continue;
+            std::fprintf(f, "[%7.1fs] ", t);
+            std::fprintf(f, fmt, v...);
+            std::fprintf(f, "\n");
+            std::fflush(f);
+        }
+    };
+    std::vector<FaceRow> train;
+    for (FaceRow const& r : readBoxes(get(a, "--boxes")))
+        if (r.split == "train")
+            train.push_back(r);
+    Miner miner;
+    for (auto const& [path, split] : readList(get(a, "--negatives"))) {
+        Gray g;
+        if (split == "train" && loadGray(path, g))
+            miner.images.push_back(shrunk(g, 1024));
+    }
+    for (size_t i = 0; i < train.size() && miner.facePhotos.size() < 2000; i += 4) {
+        Gray g;
+        if (train[i].source != "dev" && loadGray(train[i].path, g)) {
+            miner.facePhotos.push_back(std::move(g));
+            miner.faceBoxes.push_back(train[i].box);
+        }
+    }
+    say("%zu training faces, %zu face-free images, %zu face photos for misframed windows", train.size(),
+        miner.images.size(), miner.facePhotos.size());
+    // a fixed spread of the training faces when fewer are asked for
+    const size_t maxFaces = static_cast<size_t>(std::atoi(get(a, "--faces", "100000").c_str()));
+    if (train.size() > maxFaces) {
+        std::vector<FaceRow> spread;
+        for (size_t i = 0; i < maxFaces; ++i)
+            spread.push_back(train[i * train.size() / maxFaces]);
+        train.swap(spread);
+    }
+    SampleSet tight, wide;
+    positiveSamples(train, cfg, 0.5, cfg.seed, tight);
+    positiveSamples(train, cfg, 1.5, cfg.seed + 1, wide);
+    say("positives: %zu on the grid, %zu with the neighbours' offsets", tight.size(), wide.size());
+
+    Cascade cascade;
+    if (cascade.load(work + "/cascade.txt"))
+        say("resuming after stage %zu", cascade.stages.size());
+    // cells from 2 pixels, grown by a quarter and shifted by a quarter of a cell
+    FeaturePool pool(2, 2, 0.25f, 1.25f);
+    say("feature pool: %zu", pool.size());
+    while (static_cast<int>(cascade.stages.size()) < cfg.maxStages) {
+        const size_t k = cascade.stages.size();
+        if (std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count() > minutes * 60) {
+            say("time limit reached before stage %zu", k);
+            break;
+        }
+        // positives still accepted by the stages so far
+        SampleSet const& source = k == 0 ? wide : tight;
+        SampleSet pos;
+        for (size_t i = 0; i < source.size(); ++i)
+            if (cascade.passes(source.integral(i), source.inverseDeviation(i)))
+                pos.addFrom(source, i);
+        SampleSet neg;
+        size_t searched = 0;
+        const size_t variants = miner.mine(CascadeWriter::toBytes(cascade.toModel()), static_cast<size_t>(cfg.negatives),
+                                           cfg.seed * 1000003u + k, cfg.threads, neg, &searched);
+        say("stage %zu: %zu positives, %zu negatives mined from %zu variants (%zu accepted windows seen)", k,
+            pos.size(), neg.size(), variants, searched);
+        if (neg.size() < 200) {
+            say("too few negatives left to mine; stopping");
+            break;
+        }
+        StageOptions o;
+        o.seed = cfg.seed * 7919u + k;
+        o.featureFraction = featureFraction;
+        o.threads = cfg.threads;
+        if (k == 0) {
+            // rejections here let the search skip the neighbours: keep the gate
+            // and this stage within the first ten engine stages
+            o.minHitRate = 0.998;
+            o.maxStumps = 9;
+            o.maxFalseRate = 0.5;
+        } else {
+            const int first = static_cast<int>(cascade.stages[0].stumps.size());
+            o.minStumps = std::max(2, 9 - first);
+            o.maxStumps = std::min(120, 12 + 10 * static_cast<int>(k));
+        }
+        StageReport rep;
+        Stage st = trainStage(pool, pos, neg, o, &rep);
+        cascade.stages.push_back(std::move(st));
+        cascade.save(work + "/cascade.txt");
+        CascadeWriter::writeFile(work + "/model.bin", cascade.toModel());
+        say("stage %zu done: %d stumps, hit %.4f, false %.4f, median margin %.3f, gain %g", k, rep.stumps,
+            rep.hitRate, rep.falseRate, static_cast<double>(cascade.stages.back().medianMargin),
+            static_cast<double>(cascade.scoreGain()));
+    }
+    if (log != nullptr)
+        std::fclose(log);
+    return 0;
+}
+
+// ------------------------------------------------------------------ measuring
+
+constexpr int kBlock = 17;
+
+std::vector<Box> detectBoxes(Gray const& g, int rotation = 0)
+{
+    std::vector<uint8_t> frame = g.pixels;
+    std::vector<int> blocks(100 * kBlock, 0);
+    const int n = quorin_detect(frame.data(), g.width, g.height, blocks.data(), 100, rotation);
+    std::vector<Box> out;
+    for (int k = 0; k < std::clamp(n, 0, 100); ++k) {
+        const int* b = &blocks[static_cast<size_t>(k) * kBlock];
+        const double l = b[5], t = b[3], r = b[6], bt = b[4];
+        out.push_back({(l + r) / 2, (t + bt) / 2, ((r - l) + (bt - t)) / 2});
+    }
+    return out;
+}
+
+// Features evaluated per window of the exhaustive search at one mode's settings,
+// replaying the engine's loop with its skipping rule.
+struct Cost {
+    double windows = 0, classified = 0, features = 0;
+};
+
+void searchCost(CascadeDetector& d, Gray const& frame, int longSide, float step, Cost& cost)
+{
+    const Gray g = shrunk(frame, longSide);
+    const int W = g.width, H = g.height, minSide = std::min(W, H);
+    if (minSide < 32)
+        return;
+    d.setSearchStep(step, step);
+    d.setFaceSizeRange(std::max(32, minSide / 8), minSide);
+    IN_IMAGE image;
+    if (!image.Init(W, H, W, g.pixels.data()))
+        return;
+    DetectionWindow whole;
+    whole.left = 0;
+    whole.top = 0;
+    whole.right = W;
+    whole.bottom = H;
+    std::vector<ScoredWindow> unused;
+    d.exhaustiveDetect(image, {whole}, &unused); // prepares the offsets
+    std::vector<int> costOf(d.commonStages.size() + 1, 0);
+    for (size_t i = 0; i < d.commonStages.size(); ++i)
+        costOf[i + 1] = costOf[i] + (d.commonFeatures[0][i].kind != WindowFeature::EMPTY ? 1 : 0);
+    const double lf = std::log(1.25);
+    const int limit = std::min({static_cast<int>(std::log(W / 24.0) / lf), static_cast<int>(std::log(H / 24.0) / lf), 16});
+    const int minScale = std::max(0, static_cast<int>(std::ceil(std::log(std::max(32, minSide / 8) / 24.0) / lf)));
+    for (int s = minScale; s <= limit; ++s) {
+        const int w = static_cast<int>(static_cast<double>(static_cast<float>(std::pow(1.25, s)) * 24.0f) + 0.5);
+        const int sx = std::max(1, static_cast<int>(static_cast<double>(static_cast<float>(w) * step) + 0.5));
+        std::vector<int> skip(static_cast<size_t>(W / sx + 3), 0);
+        for (int y = 0; y + w < H; y += sx)
+            for (int x = 0; x + w < W; x += sx) {
+                const size_t c = static_cast<size_t>(x / sx);
+                cost.windows += 1;
+                if (skip[c] > 0) {
+                    --skip[c];
+                    continue;
+                }
+                DetectionWindow win;
+                win.left = x;
+                win.top = y;
+                win.right = x + w;
+                win.bottom = y + w;
+                float score = 0, cats[15];
+                int stage = 0;
+                const bool ok = d.classify(image, win, s, 0.0f, CascadeDetector::CLASSIFY_PLAIN, &score, cats, &stage);
+                cost.classified += 1;
+                cost.features += ok ? costOf.back() : costOf[static_cast<size_t>(stage) + 1];
+                if (!ok && stage <= 9) {
+                    skip[c] = 1;
+                    skip[c + 1] = 1;
+                }
+            }
+    }
+}
+
+int commandMeasure(std::map<std::string, std::string> const& a)
+{
+    std::vector<uint8_t> payload, packed;
+    const std::string model = get(a, "--model");
+    if (!model.empty()) {
+        std::ifstream in(model, std::ios::binary);
+        payload.assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+        if (payload.empty()) {
+            std::cerr << "measure: cannot read " << model << "\n";
+            return 1;
+        }
+        packed = packRawModel(payload);
+        ModelRegistry::instance().registerModel("mdcb", packed.data(), packed.data() + packed.size());
+    }
+    const size_t limit = static_cast<size_t>(std::atoi(get(a, "--limit", "600").c_str()));
+    std::vector<FaceRow> report, dev;
+    for (FaceRow const& r : readBoxes(get(a, "--boxes"))) {
+        if (r.split != "report")
+            continue;
+        (r.source == "dev" ? dev : report).push_back(r);
+    }
+    // a fixed spread over the report people, one face per photo
+    std::vector<FaceRow> chosen;
+    const size_t every = std::max<size_t>(1, report.size() / std::max<size_t>(1, limit));
+    for (size_t i = 0; i < report.size() && chosen.size() < limit; i += every)
+        chosen.push_back(report[i]);
+    std::vector<Gray> photos;
+    for (FaceRow const& r : chosen) {
+        Gray g;
+        loadGray(r.path, g);
+        photos.push_back(g);
+    }
+    std::vector<Gray> freeImages;
+    for (auto const& [path, split] : readList(get(a, "--negatives"))) {
+        Gray g;
+        if (split == "report" && loadGray(path, g))
+            freeImages.push_back(g);
+    }
+    std::printf("report faces %zu (of %zu), face-free report images %zu\n", chosen.size(), report.size(), freeImages.size());
+    auto found = [](std::vector<Box> const& boxes, Box const& truth) {
+        for (Box const& b : boxes)
+            if (iou(b, truth) >= 0.4)
+                return true;
+        return false;
+    };
+    for (int mode = 0; mode <= 2; ++mode) {
+        int hits = 0;
+        size_t falseHits = 0;
+        quorin_init();
+        quorin_setDetectionMode(static_cast<unsigned>(mode));
+        for (size_t i = 0; i < photos.size(); ++i) {
+            if (photos[i].pixels.empty())
+                continue;
+            if (mode == 1) {
+                // a still camera: the tracker's grid cells cover the frame in 12 frames
+                quorin_release();
+                quorin_init();
+                quorin_setDetectionMode(1);
+                bool any = false;
+                for (int f = 0; f < 12 && !any; ++f)
+                    any = found(detectBoxes(photos[i]), chosen[i].box);
+                hits += any;
+            } else {
+                const std::vector<Box> boxes = detectBoxes(photos[i]);
+                hits += found(boxes, chosen[i].box);
+                if (std::getenv("MEASURE_VERBOSE") != nullptr && i < 5) {
+                    std::printf("  %s truth %.0f %.0f %.0f:", chosen[i].path.c_str(), chosen[i].box.cx, chosen[i].box.cy,
+                                chosen[i].box.side);
+                    for (Box const& b : boxes)
+                        std::printf(" [%.0f %.0f %.0f]", b.cx, b.cy, b.side);
+                    std::printf("\n");
+                }
+            }
+        }
+        for (Gray const& g : freeImages) {
+            if (mode == 1) {
+                quorin_release();
+                quorin_init();
+                quorin_setDetectionMode(1);
+                size_t most = 0;
+                for (int f = 0; f < 12; ++f)
+                    most = std::max(most, detectBoxes(g).size());
+                falseHits += most;
+            } else {
+                falseHits += detectBoxes(g).size();
+            }
+        }
+        quorin_release();
+        std::printf("mode %d: faces found %d / %zu (%.1f%%), false hits per face-free image %.3f\n", mode, hits,
+                    photos.size(), 100.0 * hits / std::max<size_t>(1, photos.size()),
+                    static_cast<double>(falseHits) / std::max<size_t>(1, freeImages.size()));
+    }
+    // orientation search on turned photos (a fresh session each, one call)
+    const size_t turns = std::min<size_t>(photos.size(), 150);
+    for (int q = 0; q < 4; ++q) {
+        std::map<int, int> orientations;
+        for (size_t i = 0; i < turns; ++i) {
+            const Gray g = turned(photos[i], q, false);
+            std::vector<uint8_t> frame = g.pixels;
+            std::vector<int> blocks(100 * kBlock, 0);
+            int orientation = -2;
+            quorin_init();
+            quorin_detect360TrackingScaled_ornt(frame.data(), g.width, g.height, blocks.data(), 100, &orientation);
+            quorin_release();
+            ++orientations[orientation];
+        }
+        std::printf("turned by %d: orientation", 90 * q);
+        for (auto const& [o, n] : orientations)
+            std::printf(" %d:%d", o, n);
+        std::printf(" (of %zu)\n", turns);
+    }
+    // development report split: teacher faces in our framing, found in mode 2 and 0
+    for (int mode : {0, 2}) {
+        quorin_init();
+        quorin_setDetectionMode(static_cast<unsigned>(mode));
+        int hits = 0;
+        std::map<std::string, std::vector<Box>> byImage;
+        for (FaceRow const& r : dev)
+            byImage[r.path].push_back(r.box);
+        size_t total = 0, extra = 0;
+        for (auto const& [path, truths] : byImage) {
+            Gray g;
+            if (!loadGray(path, g))
+                continue;
+            const std::vector<Box> boxes = detectBoxes(g);
+            for (Box const& t : truths)
+                hits += found(boxes, t);
+            total += truths.size();
+            for (Box const& b : boxes) {
+                bool matched = false;
+                for (Box const& t : truths)
+                    matched = matched || iou(b, t) >= 0.4;
+                extra += !matched;
+            }
+        }
+        quorin_release();
+        std::printf("development report split, mode %d: faces found %d / %zu, other boxes %zu\n", mode, hits, total, extra);
+    }
+    // features evaluated per window
+    {
+        CascadeDetector d(R"({"model":"mdcb","imageMaxSize":1024,"faceMinSize":24,"faceMaxSize":1024})");
+        struct M {
+            int side;
+            float step;
+        };
+        for (M m : {M{240, 0.15f}, M{320, 0.15f}, M{640, 0.1f}}) {
+            Cost faces, free;
+            for (size_t i = 0; i < std::min<size_t>(photos.size(), 100); ++i)
+                searchCost(d, photos[i], m.side, m.step, faces);
+            for (Gray const& g : freeImages)
+                searchCost(d, g, m.side, m.step, free);
+            std::printf("long side %d step %.2f: features per window %.2f (per classified %.2f) on face photos, %.2f (%.2f) "
+                        "on face-free images\n",
+                        m.side, static_cast<double>(m.step), faces.features / std::max(1.0, faces.windows),
+                        faces.features / std::max(1.0, faces.classified), free.features / std::max(1.0, free.windows),
+                        free.features / std::max(1.0, free.classified));
+        }
+    }
+    if (!model.empty())
+        ModelRegistry::instance().unregisterModel("mdcb");
+    return 0;
+}
+
+const char* kUsage = "usage: train_cascade boxes|train|measure [--key value ...] (see the comment at the top)\n";
+
+} // namespace
+
+int main(int argc, char** argv)
+{
+    if (argc < 2) {
+        std::cerr << kUsage;
+        return 2;
+    }
+    const std::string cmd = argv[1];
+    const std::map<std::string, std::string> a = args(argc, argv, 2);
+    if (cmd == "boxes")
+        return commandBoxes(a);
+    if (cmd == "train")
+        return commandTrain(a);
+    if (cmd == "measure")
+        return commandMeasure(a);
+    std::cerr << kUsage;
+    return 2;
+}
