@@ -9,6 +9,9 @@ bash "$ROOT/scripts/setup.sh"
 if [ "${SANITIZE:-0}" = 1 ]; then
   BUILD="$ROOT/build-asan"; EXTRA=(-DQUORIN_SANITIZE=ON -DCMAKE_BUILD_TYPE=Debug -DQUORIN_BUILD_BENCH=OFF)
   export ASAN_OPTIONS=detect_leaks=1:abort_on_error=1 UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1
+  # The trackers' long runs take minutes under the sanitizers at 2000 frames;
+  # 600 frames still cover slot reuse and the bound after warm-up.
+  export QUORIN_LONG_RUN_FRAMES="${QUORIN_LONG_RUN_FRAMES:-600}"
 else
   BUILD="$ROOT/build"; EXTRA=()
 fi

@@ -10,12 +10,10 @@
 // served as a model, the stream gives each payload back through IVB mode,
 // byte for byte the same as the built-in model read in raw mode.
 TEST(IvbModelPack, BuiltInPayloadsComeBackThroughIvbMode) {
-    const char* build = std::getenv("QUORIN_BINARY_DIR");
-    ASSERT_NE(build, nullptr);
     const std::string dir = sourcetree::scratchDir("pack_ivb_models");
     const std::string out = dir + "/models.ivb";
     const std::vector<std::string> names = {"mdcb", "mdnb", "mdpb"};
-    std::string command = std::string(build) + "/tools/pack_ivb_models '" + out + "'";
+    std::string command = std::string("'") + QUORIN_PACK_IVB_MODELS + "' '" + out + "'";
     for (const std::string& name : names) command += " '" + sourcetree::path("models/" + name + ".bin") + "'";
     ASSERT_EQ(std::system(command.c_str()), 0) << command;
 
