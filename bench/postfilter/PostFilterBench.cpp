@@ -42,9 +42,9 @@ postfilterwriters::IlabsCategory randomCategory(std::mt19937& rng, int rank)
     return c;
 }
 
-postfilterwriters::SvmModelSpec randomSvm(std::mt19937& rng, int svTotal)
+postfilterwriters::SvmModelParams randomSvm(std::mt19937& rng, int svTotal)
 {
-    postfilterwriters::SvmModelSpec m;
+    postfilterwriters::SvmModelParams m;
     m.degree = 2;
     m.gamma = 0.001f;
     m.coef0 = 1.0f;

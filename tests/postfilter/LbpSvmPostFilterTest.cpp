@@ -26,8 +26,8 @@ std::vector<ScoredWindow> run(const PostFilter& f, const std::vector<ScoredWindo
 }
 
 // Serves a model file of two SVMs under `name`.
-ScopedModel serve(const char* name, const postfilterwriters::SvmModelSpec& primary,
-                  const postfilterwriters::SvmModelSpec& secondary)
+ScopedModel serve(const char* name, const postfilterwriters::SvmModelParams& primary,
+                  const postfilterwriters::SvmModelParams& secondary)
 {
     return ScopedModel(name, postfilterwriters::svmModelPayload(primary, secondary));
 }
@@ -74,7 +74,7 @@ TEST(LbpSvmJudgement, HistogramIsTakenOnTheTransposedPatch)
 
 TEST(LbpSvmConfiguration, NameJsonAndModelOfAnotherLength)
 {
-    postfilterwriters::SvmModelSpec shortModel = svmThresholdModel(0, 0.0f);
+    postfilterwriters::SvmModelParams shortModel = svmThresholdModel(0, 0.0f);
     shortModel.featureLength = 10;
     shortModel.supportVectors[0].resize(10);
     ScopedModel m = serve("pf_svm_short", shortModel, shortModel);

@@ -8,11 +8,11 @@
 #include "postfilter/SvmClassifier.h"
 #include "support/ScopedModel.h"
 
-using postfilterwriters::SvmModelSpec;
+using postfilterwriters::SvmModelParams;
 
 namespace {
 
-SvmClassifier::SvmModel toModel(const SvmModelSpec& s)
+SvmClassifier::SvmModel toModel(const SvmModelParams& s)
 {
     SvmClassifier::SvmModel m;
     m.svmType = s.svmType;
@@ -35,9 +35,9 @@ SvmClassifier::SvmModel toModel(const SvmModelSpec& s)
 // Two classes, kernel (0.5 x.s + 1)^2; class 0 owns (1,0) and (0,1), class 1
 // owns (1,1). For the feature (2, 4) the kernel values are 4, 9, 16 and
 //   sum = 0.5 * 4 - 1 * 9 + 0.25 * 16 - rho(0.5) = -3.5.
-SvmModelSpec twoClassSpec(float threshold)
+SvmModelParams twoClassSpec(float threshold)
 {
-    SvmModelSpec s;
+    SvmModelParams s;
     s.degree = 2;
     s.gamma = 0.5f;
     s.coef0 = 1.0f;
@@ -56,9 +56,9 @@ SvmModelSpec twoClassSpec(float threshold)
 //   pair (0,1): c[0][0]*1 + c[0][1]*2 = 1 - 2  = -1 -> class 1
 //   pair (0,2): c[1][0]*1 + c[0][2]*3 = -5 + 6 = 1  -> class 0
 //   pair (1,2): c[1][1]*2 + c[1][2]*3 = 6 - 6  = 0  -> class 2 (not strictly above)
-SvmModelSpec threeClassSpec(std::vector<float> rho)
+SvmModelParams threeClassSpec(std::vector<float> rho)
 {
-    SvmModelSpec s;
+    SvmModelParams s;
     s.classCount = 3;
     s.rho = rho;
     s.decisionThresholds = {0, 0, 0};
@@ -70,10 +70,10 @@ SvmModelSpec threeClassSpec(std::vector<float> rho)
     return s;
 }
 
-int32_t classifyWith(const SvmModelSpec& spec, std::vector<float> feature)
+int32_t classifyWith(const SvmModelParams& params, std::vector<float> feature)
 {
     SvmClassifier c;
-    c.setModel(toModel(spec));
+    c.setModel(toModel(params));
     return c.classify(feature.data(), static_cast<int>(feature.size()));
 }
 
@@ -100,7 +100,7 @@ TEST(SvmDecision, TwoClassesHangOnTheOneThresholdStrictly)
 {
     EXPECT_EQ(classifyWith(twoClassSpec(-4.0f), {2, 4}), 7); // -3.5 > -4: class 0
     EXPECT_EQ(classifyWith(twoClassSpec(-3.5f), {2, 4}), 9); // equal is not above
-    SvmModelSpec other = twoClassSpec(-1.0f);
+    SvmModelParams other = twoClassSpec(-1.0f);
     other.kernelType = 0; // kernel values 0: only rho and the threshold decide
     EXPECT_EQ(classifyWith(other, {2, 4}), 7);                // -0.5 > -1
 }
@@ -110,7 +110,7 @@ TEST(SvmDecision, PairSumsTakeTheCoefficientRowsCrosswiseAndTiesGoLow)
     EXPECT_EQ(classifyWith(threeClassSpec({0, 0, 0}), {1, 2, 3}), 10);     // 1:1:1, tie to class 0
     EXPECT_EQ(classifyWith(threeClassSpec({0, 2, 0}), {1, 2, 3}), 30);     // pair (0,2) now -1
     EXPECT_EQ(classifyWith(threeClassSpec({0, 0, -0.5f}), {1, 2, 3}), 20); // pair (1,2) now 0.5
-    SvmModelSpec single;
+    SvmModelParams single;
     single.classCount = 1;
     single.labels = {4};
     single.svCounts = {0};
@@ -134,7 +134,7 @@ TEST(SvmDecision, WrongFeatureLengthOrNoModelIsRefused)
 
 TEST(SvmModelLoad, ExpandsSparseVectorsAndReadsTwoModelsInSequence)
 {
-    SvmModelSpec second = threeClassSpec({0, 2, 0});
+    SvmModelParams second = threeClassSpec({0, 2, 0});
     second.supportVectors[1] = {0, 0.75f, -2.5f};
     ScopedModel model("pf_svm_pair", postfilterwriters::svmModelPayload(twoClassSpec(-4.0f), second));
     ModelReader reader("pf_svm_pair", ModelReader::RAW);
@@ -171,19 +171,19 @@ TEST(SvmModelLoad, RejectsInconsistentModels)
         ModelReader reader("pf_svm_bad", ModelReader::RAW);
         SvmClassifier c(reader);
     };
-    auto broken = [&](void (*edit)(SvmModelSpec&)) {
-        SvmModelSpec s = twoClassSpec(0);
+    auto broken = [&](void (*edit)(SvmModelParams&)) {
+        SvmModelParams s = twoClassSpec(0);
         edit(s);
         postfilterwriters::ByteWriter w;
         postfilterwriters::writeSvmModel(w, s);
         load(w.bytes());
     };
-    EXPECT_THROW(broken([](SvmModelSpec& s) { s.classCount = 0; }), qv_data_error);
-    EXPECT_THROW(broken([](SvmModelSpec& s) { s.classCount = -3; }), qv_data_error);
-    EXPECT_THROW(broken([](SvmModelSpec& s) { s.classCount = 100000; }), qv_data_error); // pair tables
-    EXPECT_THROW(broken([](SvmModelSpec& s) { s.svCounts = {2, 2}; }), qv_data_error);   // 4 of 3
-    EXPECT_THROW(broken([](SvmModelSpec& s) { s.svCounts = {4, -1}; }), qv_data_error);
-    EXPECT_THROW(broken([](SvmModelSpec& s) { s.supportVectors[2] = {1, 1, 1}; }), qv_data_error); // column 3
+    EXPECT_THROW(broken([](SvmModelParams& s) { s.classCount = 0; }), qv_data_error);
+    EXPECT_THROW(broken([](SvmModelParams& s) { s.classCount = -3; }), qv_data_error);
+    EXPECT_THROW(broken([](SvmModelParams& s) { s.classCount = 100000; }), qv_data_error); // pair tables
+    EXPECT_THROW(broken([](SvmModelParams& s) { s.svCounts = {2, 2}; }), qv_data_error);   // 4 of 3
+    EXPECT_THROW(broken([](SvmModelParams& s) { s.svCounts = {4, -1}; }), qv_data_error);
+    EXPECT_THROW(broken([](SvmModelParams& s) { s.supportVectors[2] = {1, 1, 1}; }), qv_data_error); // column 3
     {   // Counts claiming two vectors while an entry sits in row 3.
         postfilterwriters::ByteWriter w;
         postfilterwriters::writeSvmModel(w, twoClassSpec(0));

@@ -57,9 +57,9 @@ inline std::vector<uint8_t> ilabsThresholdModel(int index, const std::vector<flo
 
 // Linear two-class SVM with one support vector (class 0), the unit vector at
 // `index`: label `above` when feature[index] - rho > 0, else `below`.
-inline postfilterwriters::SvmModelSpec svmThresholdModel(int index, float rho, int32_t above = 1,
+inline postfilterwriters::SvmModelParams svmThresholdModel(int index, float rho, int32_t above = 1,
                                                          int32_t below = -1) {
-    postfilterwriters::SvmModelSpec m;
+    postfilterwriters::SvmModelParams m;
     m.rho = {rho};
     m.decisionThresholds = {0.0f};
     m.labels = {above, below};

@@ -144,7 +144,7 @@ inline IlabsCategory ilabsAsLoaded(const IlabsCategory& c) {
     return out;
 }
 
-struct SvmModelSpec {
+struct SvmModelParams {
     int32_t svmType = 0;
     int32_t kernelType = 1;
     int32_t degree = 1;
@@ -161,7 +161,7 @@ struct SvmModelSpec {
 };
 
 // Writes one model; the support vectors go out as their non-zero entries.
-inline void writeSvmModel(ByteWriter& w, const SvmModelSpec& m) {
+inline void writeSvmModel(ByteWriter& w, const SvmModelParams& m) {
     w.int32(m.svmType);
     w.int32(m.kernelType);
     w.int32(m.degree);
@@ -191,7 +191,7 @@ inline void writeSvmModel(ByteWriter& w, const SvmModelSpec& m) {
 }
 
 // The SVM filter's file: the primary model (category 0), then the secondary one.
-inline std::vector<uint8_t> svmModelPayload(const SvmModelSpec& primary, const SvmModelSpec& secondary) {
+inline std::vector<uint8_t> svmModelPayload(const SvmModelParams& primary, const SvmModelParams& secondary) {
     ByteWriter w;
     writeSvmModel(w, primary);
     writeSvmModel(w, secondary);
