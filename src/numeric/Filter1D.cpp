@@ -1,3 +1,4 @@
+#include "numeric/FilterCreate.h"
 #include "quorin/Filter1D.h"
 
 #include <cmath>
@@ -18,28 +19,6 @@ inline std::ptrdiff_t clampIndex(long long i, int n) {
 // Far more than any image side; beyond it the kernel could not be held anyway,
 // and the float-to-int conversion of the radius would be undefined.
 constexpr float kLargestRadius = 1 << 24;
-
-template <typename F>
-F* createFrom(const std::string& text) {
-    F* filter = nullptr;
-    try {
-        filter = new F();
-        filter->fromJson(text);
-        return filter;
-    } catch (const std::exception&) {
-        delete filter;
-        return nullptr;
-    }
-}
-
-template <typename F>
-Filter1D* cloneOf(const F& filter) {
-    try {
-        return new F(filter);
-    } catch (const std::bad_alloc&) {
-        return nullptr;
-    }
-}
 
 }  // namespace
 
@@ -104,9 +83,9 @@ void GaussianFilter1D::filterAtImpl(const float* data, int n, int stride, int in
                 kernel_[centre - j];
 }
 
-GaussianFilter1D* GaussianFilter1D::create(const std::string& text) { return createFrom<GaussianFilter1D>(text); }
+GaussianFilter1D* GaussianFilter1D::create(const std::string& text) { return filter_create::createFrom<GaussianFilter1D>(text); }
 
-Filter1D* GaussianFilter1D::clone() const { return cloneOf(*this); }
+Filter1D* GaussianFilter1D::clone() const { return filter_create::cloneOf<Filter1D>(*this); }
 
 std::string GaussianFilter1D::toJson() const { return "{" + jsonNamedValue("sigma", sigma_) + "}"; }
 
@@ -178,9 +157,9 @@ void DoGFilter1D::filterAtImpl(const float* data, int n, int stride, int index, 
     *out = higher - lower;
 }
 
-DoGFilter1D* DoGFilter1D::create(const std::string& text) { return createFrom<DoGFilter1D>(text); }
+DoGFilter1D* DoGFilter1D::create(const std::string& text) { return filter_create::createFrom<DoGFilter1D>(text); }
 
-Filter1D* DoGFilter1D::clone() const { return cloneOf(*this); }
+Filter1D* DoGFilter1D::clone() const { return filter_create::cloneOf<Filter1D>(*this); }
 
 std::string DoGFilter1D::toJson() const {
     return "{" + jsonNamedValue("sigmaL", sigmaL_) + ", " + jsonNamedValue("sigmaH", sigmaH_) + "}";

@@ -1,3 +1,4 @@
+#include "numeric/FilterCreate.h"
 #include "quorin/Filter2D.h"
 
 #include <cstddef>
@@ -14,28 +15,6 @@ namespace {
 
 std::unique_ptr<Filter1D> cloneFilter(const std::unique_ptr<Filter1D>& filter) {
     return std::unique_ptr<Filter1D>(filter ? filter->clone() : nullptr);
-}
-
-template <typename F>
-F* createFrom(const std::string& text) {
-    F* filter = nullptr;
-    try {
-        filter = new F();
-        filter->fromJson(text);
-        return filter;
-    } catch (const std::exception&) {
-        delete filter;
-        return nullptr;
-    }
-}
-
-template <typename F>
-Filter2D* cloneOf(const F& filter) {
-    try {
-        return new F(filter);
-    } catch (const std::bad_alloc&) {
-        return nullptr;
-    }
 }
 
 inline std::size_t area(int width, int height) {
@@ -116,9 +95,9 @@ void GaussianFilter2D::init(float sigmaHorizontal, float sigmaVertical) {
     verticalFilter_.reset(new GaussianFilter1D(sigmaVertical));
 }
 
-GaussianFilter2D* GaussianFilter2D::create(const std::string& text) { return createFrom<GaussianFilter2D>(text); }
+GaussianFilter2D* GaussianFilter2D::create(const std::string& text) { return filter_create::createFrom<GaussianFilter2D>(text); }
 
-Filter2D* GaussianFilter2D::clone() const { return cloneOf(*this); }
+Filter2D* GaussianFilter2D::clone() const { return filter_create::cloneOf<Filter2D>(*this); }
 
 std::string GaussianFilter2D::toJson() const {
     if (!horizontalFilter_ || !verticalFilter_)
@@ -188,9 +167,9 @@ void DoGFilter2D::filter(const float* src, int width, int height, int srcStride,
     }
 }
 
-DoGFilter2D* DoGFilter2D::create(const std::string& text) { return createFrom<DoGFilter2D>(text); }
+DoGFilter2D* DoGFilter2D::create(const std::string& text) { return filter_create::createFrom<DoGFilter2D>(text); }
 
-Filter2D* DoGFilter2D::clone() const { return cloneOf(*this); }
+Filter2D* DoGFilter2D::clone() const { return filter_create::cloneOf<Filter2D>(*this); }
 
 std::string DoGFilter2D::toJson() const {
     return "{" + jsonNamedValue("lowerFilter", lowerFilter_) + ", " + jsonNamedValue("higherFilter", higherFilter_) +
