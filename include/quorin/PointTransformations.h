@@ -25,7 +25,8 @@ protected:
     PointTransformation() = default;
     PointTransformation(const PointTransformation&) = default;
     PointTransformation& operator=(const PointTransformation&) = default;
-    ~PointTransformation() = default;  // values only; never deleted through the base
+    // Out of line, so that the base's vtable lives in the library alone in every build.
+    virtual ~PointTransformation();
 };
 
 // x' = offsetX + scaleX * x, y' = offsetY + scaleY * y.

@@ -9,6 +9,8 @@
 #include "core/Point2.h"
 #include "numeric/NumericTexts.h"
 
+PointTransformation::~PointTransformation() = default;
+
 QVTranslateScaleTransformation::QVTranslateScaleTransformation()
     : scaleX_(0.0f), scaleY_(0.0f), offsetX_(0.0f), offsetY_(0.0f) {}
 
