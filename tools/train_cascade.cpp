@@ -36,15 +36,7 @@
 #include <thread>
 #include <vector>
 
-#pragma GCC diagnostic push
-#pragma GCC diagnostic ignored "-Wmissing-field-initializers"
-#pragma GCC diagnostic ignored "-Wsign-compare"
-#pragma GCC diagnostic ignored "-Wunused-function"
-#pragma GCC diagnostic ignored "-Wunused-but-set-variable"
-#define STB_IMAGE_IMPLEMENTATION
-#define STBI_NO_HDR
-#include <stb/stb_image.h>
-#pragma GCC diagnostic pop
+#include "StbImageDecoder.h"
 
 #include "CascadeTrainer.h"
 #include "ModelPacking.h"

@@ -15,15 +15,7 @@
 
 #include <gtest/gtest.h>
 
-#pragma GCC diagnostic push
-#pragma GCC diagnostic ignored "-Wmissing-field-initializers"
-#pragma GCC diagnostic ignored "-Wsign-compare"
-#pragma GCC diagnostic ignored "-Wunused-function"
-#pragma GCC diagnostic ignored "-Wunused-but-set-variable"
-#define STB_IMAGE_IMPLEMENTATION
-#define STBI_NO_HDR
-#include <stb/stb_image.h>
-#pragma GCC diagnostic pop
+#include "StbImageDecoder.h"
 
 #include "api/FrameOps.h"
 #include "detector/CascadeDetector.h"
