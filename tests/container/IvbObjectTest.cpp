@@ -4,6 +4,7 @@
 #include <functional>
 #include <stdexcept>
 
+#include "support/ExpectThrow.h"
 #include "container/IvbBytes.h"
 #include "core/Errors.h"
 #include "quorin/DataBlob.h"
@@ -13,16 +14,6 @@
 namespace {
 
 using Bytes = std::vector<uint8_t>;
-
-template <typename E>
-void expectThrowWith(const std::function<void()>& f, const std::string& message) {
-    try {
-        f();
-        ADD_FAILURE() << "no exception, expected: " << message;
-    } catch (const E& e) {
-        EXPECT_EQ(std::string(e.what()), message);
-    }
-}
 
 // One entry (info + object) as the packer lays it out.
 Bytes entry(const std::string& name, uint16_t tag, const Bytes& object) {

@@ -4,6 +4,7 @@
 #include <functional>
 #include <unistd.h>
 
+#include "support/ExpectThrow.h"
 #include "container/IvbBytes.h"
 #include "core/Errors.h"
 #include "quorin/QVIVBObject.h"
@@ -23,16 +24,6 @@ struct TempFile {
                std::to_string(::getpid()) + "_" + name) {}
     ~TempFile() { std::remove(path.c_str()); }
 };
-
-template <typename E>
-void expectThrowWith(const std::function<void()>& f, const std::string& message) {
-    try {
-        f();
-        ADD_FAILURE() << "no exception, expected: " << message;
-    } catch (const E& e) {
-        EXPECT_EQ(std::string(e.what()), message);
-    }
-}
 
 Bytes basicInts(std::initializer_list<int> values) {
     QVIVBCompositeObjectPacker packer;
