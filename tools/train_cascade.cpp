@@ -555,6 +555,7 @@ struct Miner {
     // it (parts of it, too large, turned) are negatives too; hits elsewhere are
     // left alone, as a photo may hold unlabelled faces.
     std::vector<Gray> facePhotos;
+    int faceShare = 30; // percent of the variants cut from face photos (misframed and turned faces)
     std::vector<Box> faceBoxes;
     std::string modelName = "cascade_in_training";
 
@@ -586,7 +587,7 @@ struct Miner {
             for (size_t b = 0; b < batch; ++b) {
                 static const int sides[] = {160, 200, 240, 320, 400, 480, 640, 800, 1024};
                 static const float steps[] = {0.05f, 0.1f, 0.15f};
-                const bool onFace = !facePhotos.empty() && rng() % 10 < 3;
+                const bool onFace = !facePhotos.empty() && static_cast<int>(rng() % 100) < faceShare;
                 const size_t count = onFace ? facePhotos.size() : images.size();
                 vs.push_back({static_cast<size_t>(rng() % count) + (onFace ? images.size() : 0),
                               static_cast<int>(rng() % 4), sides[rng() % 9], (rng() & 1) != 0, steps[rng() % 3], rng()});
@@ -677,6 +678,11 @@ int commandTrain(std::map<std::string, std::string> const& a)
     cfg.seed = std::strtoull(get(a, "--seed", "19").c_str(), nullptr, 10);
     const double minutes = std::atof(get(a, "--minutes", "1e9").c_str());
     const double featureFraction = std::atof(get(a, "--feature-fraction", "0.015").c_str());
+    // the first stages decide the cost per window: give them a larger share of the pool
+    const double earlyFraction = std::atof(get(a, "--early-feature-fraction", get(a, "--feature-fraction", "0.015")).c_str());
+    const double firstPositiveWeight = std::atof(get(a, "--first-positive-weight", "1").c_str());
+    const double firstHitRate = std::atof(get(a, "--first-hit-rate", "0.998").c_str());
+    const size_t earlyStages = static_cast<size_t>(std::atoi(get(a, "--early-stages", "0").c_str()));
     const auto start = std::chrono::steady_clock::now();
     std::FILE* log = std::fopen((work + "/train.log").c_str(), "a");
     auto say = [&](const char* fmt, auto... v) {
@@ -695,6 +701,7 @@ int commandTrain(std::map<std::string, std::string> const& a)
         if (r.split == "train")
             train.push_back(r);
     Miner miner;
+    const int faceShare = std::clamp(std::atoi(get(a, "--face-share", "30").c_str()), 0, 100);
     for (auto const& [path, split] : readList(get(a, "--negatives"))) {
         Gray g;
         if (split == "train" && loadGray(path, g))
@@ -742,6 +749,9 @@ int commandTrain(std::map<std::string, std::string> const& a)
                 pos.addFrom(source, i);
         SampleSet neg;
         size_t searched = 0;
+        // the first stage only sees face-free images: its job is the cheap rejection
+        // of background; misframed and turned faces are left to the later stages
+        miner.faceShare = k == 0 ? 0 : faceShare;
         const size_t variants = miner.mine(CascadeWriter::toBytes(cascade.toModel()), static_cast<size_t>(cfg.negatives),
                                            cfg.seed * 1000003u + k, cfg.threads, neg, &searched);
         say("stage %zu: %zu positives, %zu negatives mined from %zu variants (%zu accepted windows seen)", k,
@@ -752,14 +762,15 @@ int commandTrain(std::map<std::string, std::string> const& a)
         }
         StageOptions o;
         o.seed = cfg.seed * 7919u + k;
-        o.featureFraction = featureFraction;
+        o.featureFraction = k < earlyStages ? earlyFraction : featureFraction;
         o.threads = cfg.threads;
         if (k == 0) {
             // rejections here let the search skip the neighbours: keep the gate
             // and this stage within the first ten engine stages
-            o.minHitRate = 0.998;
+            o.minHitRate = firstHitRate;
             o.maxStumps = 9;
             o.maxFalseRate = 0.5;
+            o.positiveWeight = firstPositiveWeight;
         } else {
             const int first = static_cast<int>(cascade.stages[0].stumps.size());
             o.minStumps = std::max(2, 9 - first);

@@ -309,8 +309,12 @@ Stage trainStage(FeaturePool const& pool, SampleSet const& positives, SampleSet 
     }
     const size_t n = np + nn;
     std::vector<double> w(n);
+    // a positive weight above 1 makes the stumps keep faces first (asymmetric
+    // boosting): a stage held to very few stumps and a very high hit rate
+    // otherwise spends them on the bulk and ties its score at the cut
+    const double pw = options.positiveWeight / (options.positiveWeight + 1.0);
     for (size_t i = 0; i < n; ++i)
-        w[i] = i < np ? 0.5 / np : 0.5 / nn;
+        w[i] = i < np ? pw / np : (1.0 - pw) / nn;
     std::vector<float> F(n, 0.0f);
     Stage stage;
     std::mt19937_64 rng(options.seed);

@@ -129,6 +129,7 @@ struct StageOptions {
     int maxStumps = 60;
     double featureFraction = 0.12; // share of the pool tried per round
     int bins = 64;                 // histogram bins for the threshold search
+    double positiveWeight = 1.0;   // starting weight of the positives against the negatives
     int threads = 2;
     uint64_t seed = 1;
 };
