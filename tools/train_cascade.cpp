@@ -682,6 +682,10 @@ int commandTrain(std::map<std::string, std::string> const& a)
     const double earlyFraction = std::atof(get(a, "--early-feature-fraction", get(a, "--feature-fraction", "0.015")).c_str());
     const double firstPositiveWeight = std::atof(get(a, "--first-positive-weight", "1").c_str());
     const double firstHitRate = std::atof(get(a, "--first-hit-rate", "0.998").c_str());
+    const int firstTries = std::max(1, std::atoi(get(a, "--first-tries", "1").c_str()));
+    // the first stage on positives at the grid point itself: cheaper rejection,
+    // at the risk of skipping a face next to a rejected neighbour
+    const bool firstTight = get(a, "--first-positives", "wide") == "tight";
     const size_t earlyStages = static_cast<size_t>(std::atoi(get(a, "--early-stages", "0").c_str()));
     const auto start = std::chrono::steady_clock::now();
     std::FILE* log = std::fopen((work + "/train.log").c_str(), "a");
@@ -742,7 +746,7 @@ int commandTrain(std::map<std::string, std::string> const& a)
             break;
         }
         // positives still accepted by the stages so far
-        SampleSet const& source = k == 0 ? wide : tight;
+        SampleSet const& source = k == 0 && !firstTight ? wide : tight;
         SampleSet pos;
         for (size_t i = 0; i < source.size(); ++i)
             if (cascade.passes(source.integral(i), source.inverseDeviation(i)))
@@ -778,6 +782,20 @@ int commandTrain(std::map<std::string, std::string> const& a)
         }
         StageReport rep;
         Stage st = trainStage(pool, pos, neg, o, &rep);
+        // the first stage's score takes few distinct values, so where its cut falls
+        // varies much with the features drawn: try several draws, keep the one that
+        // rejects most background (its hit rate is held by construction)
+        for (int t = 1; k == 0 && t < firstTries; ++t) {
+            StageOptions other = o;
+            other.seed = o.seed + 104729u * static_cast<uint64_t>(t);
+            StageReport r;
+            Stage candidate = trainStage(pool, pos, neg, other, &r);
+            say("stage 0, draw %d: hit %.4f, false %.4f", t, r.hitRate, r.falseRate);
+            if (r.falseRate < rep.falseRate) {
+                st = std::move(candidate);
+                rep = r;
+            }
+        }
         cascade.stages.push_back(std::move(st));
         cascade.save(work + "/cascade.txt");
         CascadeWriter::writeFile(work + "/model.bin", cascade.toModel());
@@ -1031,9 +1049,22 @@ int commandMeasure(std::map<std::string, std::string> const& a)
     return 0;
 }
 
-const char* kUsage = "usage: train_cascade boxes|train|measure [--key value ...] (see the comment at the top)\n";
+const char* kUsage = "usage: train_cascade boxes|train|measure|model [--key value ...] (see the comment at the top)\n";
 
 } // namespace
+
+// Engine payload of a saved cascade state (for example one whose stages were
+// spliced from two runs).
+int commandModel(std::map<std::string, std::string> const& a)
+{
+    Cascade cascade;
+    if (!cascade.load(get(a, "--cascade"))) {
+        std::cerr << "cannot read the cascade state " << get(a, "--cascade") << "\n";
+        return 1;
+    }
+    CascadeWriter::writeFile(get(a, "--out"), cascade.toModel());
+    return 0;
+}
 
 int main(int argc, char** argv)
 {
@@ -1049,6 +1080,8 @@ int main(int argc, char** argv)
         return commandTrain(a);
     if (cmd == "measure")
         return commandMeasure(a);
+    if (cmd == "model")
+        return commandModel(a);
     std::cerr << kUsage;
     return 2;
 }
