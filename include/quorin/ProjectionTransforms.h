@@ -5,6 +5,7 @@
 // a named metric, and a PCA projection (subtract a mean, apply a matrix).
 // Both only read when used: one object may serve several threads.
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -37,6 +38,24 @@ public:
     const std::vector<std::vector<float>>& centroids() const { return centroids_; }
     const std::string& metric() const { return metric_; }
 
+    // ensures: the binary form, a composite IVB object of four nameless
+    //          entries: tag 64 dimension and tag 192 centroidNum (unsigned
+    //          int, 1 element each), tag 193 the rows end to end (float,
+    //          centroidNum * dimension), tag 194 metric (char, its bytes).
+    // throws:  qv_ivb_conversion_error "QV IVB object conversion error" for
+    //          rows beyond an object's 32-bit element count.
+    std::vector<uint8_t> toIvb() const;
+    // ensures: the four members of the binary form.
+    // throws:  qv_data_error "Could not find corresponding object id" for a
+    //          missing member; qv_ivb_conversion_error "QV IVB object
+    //          conversion error" for damaged bytes, a member of another type,
+    //          rows whose length differs from centroidNum * dimension, or
+    //          centroids of dimension 0 (their number is not backed by any
+    //          stored byte); std::invalid_argument from the unpacker for a
+    //          member that isn't a basic object. On any failure the classifier
+    //          is unchanged.
+    void fromIvb(const std::vector<uint8_t>& bytes);
+
 private:
     unsigned int dimension_;
     unsigned int centroidNum_;
@@ -64,6 +83,25 @@ public:
     // throws:   qv_invalid_argument when length < rawDim() (nothing is read
     //           beyond what the caller says the input holds).
     void transform(const float* input, unsigned int length, float* output) const;
+
+    // ensures: the binary form, a composite IVB object of four nameless
+    //          entries: tag 64 rawDim and tag 128 pcaDim (unsigned int, 1
+    //          element each), tag 129 mean (float, rawDim), tag 130 the
+    //          projection row by row (float, pcaDim * rawDim: element (r, c)
+    //          at r * rawDim + c, although memory holds it column-major).
+    // throws:  qv_ivb_conversion_error "QV IVB object conversion error" for a
+    //          projection beyond an object's 32-bit element count.
+    std::vector<uint8_t> toIvb() const;
+    // ensures: the four members of the binary form.
+    // throws:  qv_data_error "Could not find corresponding object id" for a
+    //          missing member; qv_ivb_conversion_error "QV IVB object
+    //          conversion error" for damaged bytes, a member of another type,
+    //          a mean or projection whose length differs from what rawDim and
+    //          pcaDim say, or pcaDim above 0 with rawDim 0 (an output length
+    //          not backed by any stored byte); std::invalid_argument from the
+    //          unpacker for a member that isn't a basic object. On any failure
+    //          the transform is unchanged.
+    void fromIvb(const std::vector<uint8_t>& bytes);
 
 private:
     unsigned int rawDim_;

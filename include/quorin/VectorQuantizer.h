@@ -6,6 +6,7 @@
 // the leaves with the codes 0..n. A loaded quantizer only reads: it may
 // quantize from several threads.
 
+#include <cstdint>
 #include <vector>
 
 #include "quorin/export.h"
@@ -68,7 +69,29 @@ public:
     unsigned int codeNum() const { return innerNodeNum_ + 1; }
     const std::vector<QuantizerNode>& nodes() const { return nodes_; }
 
+    // ensures: the binary form, a composite IVB object of four nameless
+    //          entries: tag 96 innerNodeNum and tag 64 dimension (unsigned int,
+    //          1 element each), tag 97 the inner nodes' weights end to end
+    //          (float, innerNodeNum * dimension), tag 98 their thresholds
+    //          (float, innerNodeNum).
+    // throws:  qv_ivb_conversion_error "QV IVB object conversion error" for a
+    //          weight array beyond an object's 32-bit element count.
+    std::vector<uint8_t> toIvb() const;
+    // ensures: the tree of the binary form, as setTree builds it. A loaded
+    //          tree with dimension 0 has inner nodes without weights, on which
+    //          quantize throws qv_unsupported_error.
+    // throws:  qv_data_error "Could not find corresponding object id" for a
+    //          missing member; qv_ivb_conversion_error "QV IVB object
+    //          conversion error" for damaged bytes, a member of another type,
+    //          or an array whose length differs from what the counts say;
+    //          std::invalid_argument from the unpacker for a member that isn't
+    //          a basic object. On any failure the quantizer is unchanged.
+    void fromIvb(const std::vector<uint8_t>& bytes);
+
 private:
+    void build(unsigned int innerNodeNum, unsigned int dimension, const std::vector<float>& weights,
+               const std::vector<float>& thresholds);
+
     unsigned int innerNodeNum_;
     unsigned int dimension_;
     std::vector<QuantizerNode> nodes_;

@@ -4,6 +4,8 @@
 #include <limits>
 #include <new>
 
+#include "container/IvbMembers.h"
+
 namespace {
 
 enum Tag : uint32_t {
@@ -21,19 +23,6 @@ enum Tag : uint32_t {
 const char* const kConversionError = "QV IVB object conversion error";
 
 bool hasRange(DataProperty::DataType type) { return type == DataProperty::UINT32 || type == DataProperty::UINT64; }
-
-// One scalar member: anything but exactly one element of T is damage.
-template <typename T>
-T unpackScalar(const QVIVBCompositeObjectUnpacker& unpacker, uint32_t tag) {
-    const uint32_t id = unpacker.getObjId(std::string(), tag);
-    QVIVBObjectSubType subType;
-    unsigned int count = 0;
-    unpacker.getBasicObjectPropertyImpl(id, subType, count);
-    if (count != 1) throw qv_ivb_conversion_error(kConversionError);
-    T value{};
-    unpacker.unpackBasicObjectImpl(id, &value, 1);
-    return value;
-}
 
 }  // namespace
 
@@ -133,13 +122,13 @@ void DataProperty::fromIvb(const std::vector<uint8_t>& bytes) {
     unpacker.parse(bytes);
     // The stored value is the 32-bit pattern of the signed type; unknown values
     // are kept as they are and simply have no sub type.
-    dataType_ = static_cast<DataType>(static_cast<int32_t>(unpackScalar<unsigned int>(unpacker, kTagDataType)));
-    xNum_ = unpackScalar<unsigned int>(unpacker, kTagXNum);
-    yNum_ = unpackScalar<unsigned int>(unpacker, kTagYNum);
-    fLen_ = unpackScalar<unsigned int>(unpacker, kTagFLen);
+    dataType_ = static_cast<DataType>(static_cast<int32_t>(ivbmember::scalar<unsigned int>(unpacker, kTagDataType)));
+    xNum_ = ivbmember::scalar<unsigned int>(unpacker, kTagXNum);
+    yNum_ = ivbmember::scalar<unsigned int>(unpacker, kTagYNum);
+    fLen_ = ivbmember::scalar<unsigned int>(unpacker, kTagFLen);
     if (hasRange(dataType_)) {
-        minVal_ = unpackScalar<unsigned long long>(unpacker, kTagMinVal);
-        maxVal_ = unpackScalar<unsigned long long>(unpacker, kTagMaxVal);
+        minVal_ = ivbmember::scalar<unsigned long long>(unpacker, kTagMinVal);
+        maxVal_ = ivbmember::scalar<unsigned long long>(unpacker, kTagMaxVal);
     }
 }
 

@@ -2,6 +2,7 @@
 
 #include <string>
 
+#include "container/IvbMembers.h"
 #include "quorin/QVIVBObject.h"
 
 namespace {
@@ -12,25 +13,6 @@ const uint32_t kTagProjection = 161;
 const uint32_t kTagSecondValue = 162;
 
 const char* const kConversionError = "QV IVB object conversion error";
-
-// The id of the array under tag after checking that it holds exactly
-// `expected` elements: an array that disagrees with its count member is not
-// trusted either way, and is refused before anything is allocated for it.
-uint32_t checkedId(const QVIVBCompositeObjectUnpacker& unpacker, uint32_t tag, unsigned int expected) {
-    const uint32_t id = unpacker.getObjId(std::string(), tag);
-    QVIVBObjectSubType subType;
-    unsigned int count = 0;
-    unpacker.getBasicObjectPropertyImpl(id, subType, count);
-    if (count != expected) throw qv_ivb_conversion_error(kConversionError);
-    return id;
-}
-
-template <typename T>
-T unpackScalar(const QVIVBCompositeObjectUnpacker& unpacker, uint32_t tag) {
-    T value{};
-    unpacker.unpackBasicObjectImpl(checkedId(unpacker, tag, 1), &value, 1);
-    return value;
-}
 
 }  // namespace
 
@@ -48,11 +30,11 @@ std::vector<uint8_t> FaceModelData::toIvb() const {
 void FaceModelData::fromIvb(const std::vector<uint8_t>& bytes) {
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(bytes);
-    const int32_t newDimension = unpackScalar<int>(unpacker, kTagDimension);
-    const float newFirst = unpackScalar<float>(unpacker, kTagFirstValue);
-    const float newSecond = unpackScalar<float>(unpacker, kTagSecondValue);
+    const int32_t newDimension = ivbmember::scalar<int>(unpacker, kTagDimension);
+    const float newFirst = ivbmember::scalar<float>(unpacker, kTagFirstValue);
+    const float newSecond = ivbmember::scalar<float>(unpacker, kTagSecondValue);
     if (newDimension < 0) throw qv_ivb_conversion_error(kConversionError);
-    const uint32_t id = checkedId(unpacker, kTagProjection, static_cast<unsigned int>(newDimension));
+    const uint32_t id = ivbmember::checkedId(unpacker, kTagProjection, static_cast<unsigned int>(newDimension));
     Eigen::VectorXf newProjection(newDimension);
     unpacker.unpackBasicObjectImpl(id, newProjection.data(), static_cast<unsigned int>(newDimension));
     dimension = newDimension;

@@ -7,7 +7,9 @@
 
 #include "container/FaceModelData.h"
 #include "quorin/DataBlob.h"
+#include "quorin/ProjectionTransforms.h"
 #include "quorin/QVIVBObject.h"
+#include "quorin/VectorQuantizer.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     const std::vector<uint8_t> bytes(data, data + size);
@@ -44,6 +46,31 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         FaceModelData model;
         model.fromIvb(bytes);
         (void)model.toIvb();
+    } catch (const std::exception&) {
+    }
+    // The numeric models: a loaded one must also work on a vector of its size.
+    try {
+        VectorQuantizer quantizer;
+        quantizer.fromIvb(bytes);
+        const std::vector<float> v(quantizer.dimension(), 0.25f);
+        (void)quantizer.quantize(v.data());
+        (void)quantizer.toIvb();
+    } catch (const std::exception&) {
+    }
+    try {
+        NearestCentroidClassifier classifier;
+        classifier.fromIvb(bytes);
+        (void)classifier.classify(std::vector<float>(classifier.dimension(), 0.25f));
+        (void)classifier.toIvb();
+    } catch (const std::exception&) {
+    }
+    try {
+        PcaTransform pca;
+        pca.fromIvb(bytes);
+        const std::vector<float> in(pca.rawDim(), 0.25f);
+        std::vector<float> out(pca.pcaDim());
+        pca.transform(in.data(), pca.rawDim(), out.data());
+        (void)pca.toIvb();
     } catch (const std::exception&) {
     }
     return 0;

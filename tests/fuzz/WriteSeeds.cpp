@@ -25,6 +25,9 @@ int main(int argc, char** argv) {
     put(objects + "/property", ivbgolden::uint32Property());
     put(objects + "/blob", ivbgolden::byteBlob());
     put(objects + "/facemodel", ivbgolden::faceModel());
+    put(objects + "/quantizer", ivbgolden::vectorQuantizer());
+    put(objects + "/centroids", ivbgolden::nearestCentroids());
+    put(objects + "/pca", ivbgolden::pcaTransform());
     put(streams + "/one_object", ivbgolden::streamWithOneObject());
     put(streams + "/smallest", ivbgolden::smallestStream());
     return 0;
