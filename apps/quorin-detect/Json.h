@@ -5,13 +5,9 @@
 #include <vector>
 
 #include "Faces.h"
+#include "JsonString.h"
 
 namespace qcli {
-
-// A JSON string literal of any bytes: quotes, backslashes and control
-// characters are escaped, and bytes that are not valid UTF-8 become U+FFFD, so
-// the output is valid JSON for every file name.
-std::string jsonString(const std::string& text);
 
 // {"rect":{...},"landmarks":{...},"roll":n}
 std::string faceJson(const Face& face);
