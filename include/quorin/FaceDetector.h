@@ -41,7 +41,8 @@ public:
     // kept); qv_operation_error "Failed to create PostFilter" for an unknown or
     // failing post filter (everything is released).
     void init(const std::string& configurationText);
-    // ensures: the cascade, merger, post filter and tracker are gone.
+    // ensures: the cascade, merger, post filter, tracker and frame buffers
+    // are gone.
     void release();
 
     // ensures: the known faces are discarded; 1 simple, 2 Kalman, 3 and 4
@@ -83,6 +84,11 @@ private:
     std::vector<ScoredWindow> rawHits;
     std::vector<ScoredWindow> mergedHits;
     std::vector<ScoredWindow> finalHits;
+    // The frame's integral image and the smaller per-frame lists, kept
+    // between frames for their capacity so that a frame allocates nothing
+    // once the largest frame has been seen.
+    struct FrameScratch;
+    FrameScratch* scratch = nullptr;
 };
 
 #endif

@@ -151,6 +151,7 @@ void CascadeDetector::initClassifiers(std::string const& modelPath)
         }
     }
     preparedWidth = 0;
+    scaleFeatures.clear();
 }
 
 void CascadeDetector::initScaledWindows()
@@ -235,13 +236,30 @@ void CascadeDetector::prepareForFastComputing(int stride)
     // Every scale that has features is prepared, not only the present range:
     // a scale that rejoins the range later must never run on offsets of an
     // older width.
+    scaleFeatures.resize(commonFeatures.size());
     for (int s = 0; s < static_cast<int>(commonFeatures.size()); ++s) {
         for (WindowFeature& f : commonFeatures[s])
             f.prepareOffsets(stride);
         for (std::vector<WindowFeature>& branch : branchFeatures[s])
             for (WindowFeature& f : branch)
                 f.prepareOffsets(stride);
+        if (hasFeatures(s))
+            scaleFeatures[s].build(commonFeatures[s], branchFeatures[s], stride);
+        else
+            scaleFeatures[s].clear();
     }
+}
+
+ScaleFeatures const* CascadeDetector::featuresFor(int scale, int stride)
+{
+    if (scale < 0 || scale >= static_cast<int>(commonFeatures.size()) || !hasFeatures(scale))
+        return nullptr;
+    if (scaleFeatures.size() != commonFeatures.size())
+        scaleFeatures.resize(commonFeatures.size());
+    ScaleFeatures& features = scaleFeatures[static_cast<size_t>(scale)];
+    if (features.stride() != stride && !features.build(commonFeatures[scale], branchFeatures[scale], stride))
+        return nullptr;
+    return &features;
 }
 
 bool CascadeDetector::hasFeatures(int scale) const
@@ -288,15 +306,21 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
         *stage = -1;
         return false;
     }
+    ScaleFeatures const* features = featuresFor(scale, image.stride);
+    if (features == nullptr) {
+        *score = kDeadScore;
+        *stage = -1;
+        return false;
+    }
     const float inverseDeviation = image.ComputeNorm(window);
     float scores[kMaxCategories] = {};
-    const int offset = window.left + image.stride * window.top;
+    uint32_t const* p = image.data + (window.left + image.stride * window.top);
 
     const int commonCount = static_cast<int>(commonStages.size());
     CascadeStage const* stages = commonStages.data();
-    WindowFeature const* features = commonFeatures[scale].data();
-    for (int i = 0; i < commonCount; ++i) {
-        if (stages[i].UpdateScoreAndThreshold(features[i].Eval(image, inverseDeviation, offset), scores)) {
+    ScaleFeatures::Cursor feature = features->common();
+    for (int i = 0; i < commonCount; ++i, feature.next()) {
+        if (stages[i].UpdateScoreAndThreshold(feature.value(p, inverseDeviation), scores)) {
             *score = scores[0];
             *stage = i;
             return false;
@@ -321,10 +345,10 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     scores[0] = best;
 
     std::vector<CascadeStage> const& branch = branchStages[bestIndex];
-    WindowFeature const* branchFeature = branchFeatures[scale][bestIndex].data();
+    ScaleFeatures::Cursor branchFeature = features->branch(bestIndex);
     const int branchCount = static_cast<int>(branch.size());
-    for (int j = 0; j < branchCount; ++j) {
-        if (branch[j].UpdateScoreAndThreshold(branchFeature[j].Eval(image, inverseDeviation, offset), scores)) {
+    for (int j = 0; j < branchCount; ++j, branchFeature.next()) {
+        if (branch[j].UpdateScoreAndThreshold(branchFeature.value(p, inverseDeviation), scores)) {
             *score = scores[0];
             *stage = commonCount;
             return false;

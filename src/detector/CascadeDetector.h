@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "detector/CascadeStage.h"
+#include "detector/ScaleFeatures.h"
 #include "detector/WindowFeature.h"
 #include "image/DetectionWindow.h"
 #include "image/IntegralImage.h"
@@ -47,9 +48,11 @@ public:
     void setFaceSizeRange(int minSize, int maxSize);
     void prepareForFastComputing(int stride);
 
-    // Requires: offsets prepared for the image's width, and `window` of the
-    // scale's size and wholly inside the image. True when the window passes;
-    // `stage` then holds its category, otherwise how far it got.
+    // Requires: `window` of the scale's size and wholly inside the image.
+    // True when the window passes; `stage` then holds its category, otherwise
+    // how far it got. Lays out the scale's features for the image's stride
+    // when prepareForFastComputing has not; a scale without features rejects
+    // at once (score -20, stage -1).
     bool classify(IN_IMAGE const& image, DetectionWindow const& window, int scale, float minAverage,
                   ClassifyMode mode, float* score, float* categoryScores, int* stage);
 
@@ -107,8 +110,12 @@ public:
     std::vector<int32_t> scaleOffsets;
     std::vector<int32_t> spiralX;
     std::vector<int32_t> spiralY;
+    // The features of each scale laid out for the search loop, for the
+    // stride of the last preparation (see ScaleFeatures).
+    std::vector<ScaleFeatures> scaleFeatures;
 
 private:
+    ScaleFeatures const* featuresFor(int scale, int stride);
     int scaleForSize(int size) const;
     int nearestScaleForSize(int size) const;
     int searchScaleLimit(int width, int height) const;

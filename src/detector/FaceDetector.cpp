@@ -39,27 +39,40 @@ const char* trackerDescription(QVFaceTrackingMode mode)
     }
 }
 
+// The matching's lists, kept by the detector between frames.
+struct JoinScratch {
+    std::vector<std::vector<float>> overlap;
+    std::vector<int> columnOfRow;
+    std::vector<int> rowOfColumn;
+};
+
 // Matches the post-filtered new hits against the tracked hits, grows tracked
 // windows to a wider match, and appends the unmatched new ones.
 void joinNewHits(std::vector<ScoredWindow>& trackedHits, const std::vector<ScoredWindow>& finalHits, int width,
-                 int height)
+                 int height, JoinScratch& scratch)
 {
     const size_t tracked = trackedHits.size();
     const size_t fresh = finalHits.size();
 
     // Greedy best-first on overlaps, the same assignment the trackers use:
-    // rows are tracked hits, columns new ones.
-    std::vector<int> columnOfRow;
+    // rows are tracked hits, columns new ones. Rows are resized, not made
+    // anew, so that they keep their capacity.
+    std::vector<int>& columnOfRow = scratch.columnOfRow;
+    columnOfRow.clear();
     if (tracked > 0 && fresh > 0) {
-        std::vector<std::vector<float>> overlap(tracked, std::vector<float>(fresh, 0.0f));
-        for (size_t i = 0; i < tracked; ++i)
+        std::vector<std::vector<float>>& overlap = scratch.overlap;
+        overlap.resize(tracked);
+        for (size_t i = 0; i < tracked; ++i) {
+            overlap[i].assign(fresh, 0.0f);
             for (size_t j = 0; j < fresh; ++j) {
                 const float v = trackedHits[i].window.Overlap(finalHits[j].window);
                 overlap[i][j] = double(v) < kMinOverlap ? 0.0f : v;
             }
+        }
         Tracker::match(overlap, &columnOfRow);
     }
-    std::vector<int> rowOfColumn(fresh, -1);
+    std::vector<int>& rowOfColumn = scratch.rowOfColumn;
+    rowOfColumn.assign(fresh, -1);
     for (size_t i = 0; i < columnOfRow.size(); ++i)
         if (columnOfRow[i] >= 0) rowOfColumn[size_t(columnOfRow[i])] = int(i);
 
@@ -93,6 +106,15 @@ void joinNewHits(std::vector<ScoredWindow>& trackedHits, const std::vector<Score
 }
 
 } // namespace
+
+struct FaceDetector::FrameScratch {
+    IN_IMAGE image;
+    std::vector<DetectionWindow> previous;
+    std::vector<DetectionWindow> predicted;
+    std::vector<DetectionWindow> regions;
+    std::vector<DetectionWindow> finalWindows;
+    JoinScratch join;
+};
 
 FaceDetector::FaceDetector() = default;
 
@@ -132,6 +154,8 @@ void FaceDetector::release()
     postFilter = nullptr;
     delete tracker;
     tracker = nullptr;
+    delete scratch;
+    scratch = nullptr;
 }
 
 void FaceDetector::setTrackingMode(QVFaceTrackingMode mode)
@@ -198,37 +222,46 @@ void FaceDetector::detect(const unsigned char* gray, int width, int height, std:
     mergedHits.clear();
     finalHits.clear();
 
-    // The host's rows are adjacent: the stride is the width.
-    IN_IMAGE image;
+    if (scratch == nullptr) scratch = new FrameScratch();
+    FrameScratch& frame = *scratch;
+
+    // The host's rows are adjacent: the stride is the width. The integral
+    // image is rebuilt in place and grows only for a larger frame.
+    IN_IMAGE& image = frame.image;
     if (!image.Init(width, height, width, gray)) throw qv_operation_error("Frame could not be prepared for the search");
 
+    frame.regions.clear();
     if (tracker != nullptr) {
-        std::vector<DetectionWindow> previous, predicted;
+        std::vector<DetectionWindow>& previous = frame.previous;
+        std::vector<DetectionWindow>& predicted = frame.predicted;
+        previous.clear();
+        predicted.clear();
         tracker->getPreviousFaces(&previous);
         tracker->predict(image, &predicted);
         // spreadDetect pairs the two lists by index; a tracker that predicts
         // fewer windows than it knows must not make it read past the end.
         if (predicted.size() < previous.size()) predicted.resize(previous.size(), DetectionWindow());
         detector->spreadDetect(image, previous, predicted, &trackedHits);
-        detector->exhaustiveDetect(image, {exhaustiveDetectSubRegion(width, height)}, &rawHits);
+        frame.regions.push_back(exhaustiveDetectSubRegion(width, height));
     } else {
         DetectionWindow whole;
         whole.left = 0;
         whole.right = width;
         whole.top = 0;
         whole.bottom = height;
-        detector->exhaustiveDetect(image, {whole}, &rawHits);
+        frame.regions.push_back(whole);
     }
+    detector->exhaustiveDetect(image, frame.regions, &rawHits);
 
     merger->mergeWindows(rawHits, mergedHits);
     postFilter->filter(image, mergedHits, &finalHits);
 
     if (tracker != nullptr) {
-        joinNewHits(trackedHits, finalHits, width, height);
+        joinNewHits(trackedHits, finalHits, width, height, frame.join);
         finalHits.clear();
         merger->mergeWindows(trackedHits, finalHits);
-        std::vector<DetectionWindow> windows;
-        windows.reserve(finalHits.size());
+        std::vector<DetectionWindow>& windows = frame.finalWindows;
+        windows.clear();
         for (const ScoredWindow& hit : finalHits) windows.push_back(hit.window);
         tracker->update(image, windows);
     }

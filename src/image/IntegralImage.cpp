@@ -36,6 +36,20 @@ float const* sharedSqrtTable()
     return table;
 }
 
+// What ComputeNorm makes of each entry of the square-root table, so that a
+// window costs a lookup and no division.
+float const* sharedInverseDeviationTable()
+{
+    static const float* table = [] {
+        static float values[65536];
+        float const* roots = sharedSqrtTable();
+        for (int i = 0; i < 65536; ++i)
+            values[i] = roots[i] < 1.0f ? 1.0f : 1.0f / roots[i];
+        return values;
+    }();
+    return table;
+}
+
 } // namespace
 
 // ---------------------------------------------------------------- I_IMAGE
@@ -226,11 +240,13 @@ void I_IMAGE::CropScaleToImage(IMAGE* target, DetectionWindow const* window) con
 IN_IMAGE::IN_IMAGE()
 {
     sqrtTable = sharedSqrtTable();
+    inverseDeviationTable = sharedInverseDeviationTable();
 }
 
 IN_IMAGE::IN_IMAGE(int width, int height)
 {
     sqrtTable = sharedSqrtTable();
+    inverseDeviationTable = sharedInverseDeviationTable();
     if (!Realloc(width, height))
         throw kAllocationFailure;
 }
@@ -289,14 +305,21 @@ bool IN_IMAGE::Init(int width, int height, int sourceStride, unsigned char const
         uint64_t* rowSq = squared + static_cast<std::ptrdiff_t>(y + 1) * s;
         row[0] = 0;
         rowSq[0] = 0;
+        // The running sums are the only serial part: they go into the row
+        // first, and the row above is added in a second, vectorisable loop.
+        // Integer sums, so the split gives the same entries.
         uint32_t running = 0;
         uint64_t runningSq = 0;
         for (int x = 0; x < width; ++x) {
             const uint32_t p = src[x];
             running += p;
             runningSq += p * p;
-            row[x + 1] = above[x + 1] + running;
-            rowSq[x + 1] = aboveSq[x + 1] + runningSq;
+            row[x + 1] = running;
+            rowSq[x + 1] = runningSq;
+        }
+        for (int x = 1; x <= width; ++x) {
+            row[x] += above[x];
+            rowSq[x] += aboveSq[x];
         }
     }
     return true;
@@ -324,8 +347,5 @@ float IN_IMAGE::ComputeNorm(DetectionWindow const& w) const
     int index = 0;
     if (variance >= 1.0)
         index = variance < 65535.0 ? static_cast<int>(variance) : 65535;
-    const float r = sqrtTable[index];
-    if (r < 1.0f)
-        return 1.0f;
-    return 1.0f / r;
+    return inverseDeviationTable[index];
 }

@@ -87,6 +87,8 @@ public:
 
 private:
     int32_t squaredCapacity = 0;
+    // 1 / sqrtTable[i], or 1 where the root is below 1; shared like sqrtTable.
+    float const* inverseDeviationTable = nullptr;
 };
 
 #endif
