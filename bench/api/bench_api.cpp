@@ -2,7 +2,7 @@
 // whole quorin_detect with stand-in stages that report a fixed list of faces
 // (so the text bridge, sort and block writing are what is measured), and the
 // whole entry with the real engines in each detection mode on a 640 x 480
-// frame: the group photo of the development data cache when it has been
+// frame: a face photo of the development data cache when it has been
 // fetched (scripts/fetch-data.sh), else a fixed pattern.
 
 #include <benchmark/benchmark.h>
@@ -61,9 +61,9 @@ void BM_DetectEntry(benchmark::State& state) {
 }
 BENCHMARK(BM_DetectEntry)->Arg(0)->Arg(1)->Arg(10)->Arg(100);
 
-std::vector<unsigned char> groupPhoto640() {
+std::vector<unsigned char> facePhoto640() {
     int w = 0, h = 0, n = 0;
-    unsigned char* photo = stbi_load(devdata::photo("tracking_faces.jpg").c_str(), &w, &h, &n, 1);
+    unsigned char* photo = stbi_load(devdata::photo("franck_01829.jpg").c_str(), &w, &h, &n, 1);
     if (photo == nullptr) return qtest::patternFrame(640, 480);
     std::vector<unsigned char> frame(640 * 480);
     resizeNearest(photo, w, h, frame.data(), 640, 480);
@@ -75,7 +75,7 @@ std::vector<unsigned char> groupPhoto640() {
 // mode state.range(0) (0: step 0.15, 1: tracking at 320, 2: step 0.1 at 640).
 // In mode 1 the tracker carries the faces from frame to frame, as on a clip.
 void BM_DetectEntryMode(benchmark::State& state) {
-    const std::vector<unsigned char> source = groupPhoto640();
+    const std::vector<unsigned char> source = facePhoto640();
     std::vector<unsigned char> frame(source);
     std::vector<int> results(100 * 17);
     quorin_init();
