@@ -41,19 +41,16 @@ public:
     // the first stage); true when the window is rejected here.
     bool UpdateScoreAndThreshold(float value, float* scores) const
     {
+        // Three comparisons down the tree of thresholds: value >= t[3] picks
+        // the half, then t[1] or t[5] the quarter, then t[0], t[2], t[4] or
+        // t[6] the bin. Written with indices instead of branches, since the
+        // branches follow the image and mispredict; the comparisons are the
+        // same, so a NaN still lands in bin 6.
         float const* t = binThresholds;
-        int bin;
-        if (value >= t[3]) {
-            if (value >= t[1])
-                bin = value < t[0] ? 1 : 0;
-            else
-                bin = value < t[2] ? 3 : 2;
-        } else {
-            if (value >= t[5])
-                bin = value < t[4] ? 5 : 4;
-            else
-                bin = value < t[6] ? 7 : 6;
-        }
+        const int lowerHalf = !(value >= t[3]);
+        const int lowerQuarter = !(value >= t[1 + 4 * lowerHalf]);
+        const int quarter = 4 * lowerHalf + 2 * lowerQuarter;
+        const int bin = quarter + (value < t[quarter] ? 1 : 0);
         if (remapFlag != 0)
             applyRemap(scores);
         if (scoreCount == 1) {

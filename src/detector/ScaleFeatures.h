@@ -35,7 +35,7 @@ public:
 
         // Same arithmetic as HaarFeature::Eval: unsigned corner sums, each
         // times its weight, accumulated in rectangle order, then scaled.
-        float value(uint32_t const* p, float inverseDeviation) const
+        [[gnu::always_inline]] float value(uint32_t const* p, float inverseDeviation) const
         {
             const Feature f = *feature_;
             if (f.kind == WindowFeature::HAAR) {
@@ -43,6 +43,14 @@ public:
                 if (f.count == 2) {
                     float v = sum(p, r[0]) * r[0].weight;
                     v += sum(p, r[1]) * r[1].weight;
+                    return v * inverseDeviation;
+                }
+                if (f.count == 3) {
+                    // As the loop below: from 0, which keeps the sign of a zero sum.
+                    float v = 0.0f;
+                    v += sum(p, r[0]) * r[0].weight;
+                    v += sum(p, r[1]) * r[1].weight;
+                    v += sum(p, r[2]) * r[2].weight;
                     return v * inverseDeviation;
                 }
                 if (f.count == 4) {
@@ -68,7 +76,7 @@ public:
         }
 
     private:
-        static float sum(uint32_t const* p, Rect const& r)
+        [[gnu::always_inline]] static float sum(uint32_t const* p, Rect const& r)
         {
             return static_cast<float>(p[r.bottomRight] + p[r.topLeft] - p[r.topRight] - p[r.bottomLeft]);
         }
