@@ -40,6 +40,10 @@ constexpr const char* kDefaultCascade = "/usr/share/opencv4/haarcascades/haarcas
 constexpr int kMaxFaces = 100;
 constexpr int kBlockInts = 17;
 
+// Wall time by default; with --cpu-time the calling thread's CPU time, which
+// on a machine shared with other jobs leaves out the time the thread waited.
+bool g_threadCpuTime = false;
+
 struct Box {
   int left, top, right, bottom;
 };
@@ -155,9 +159,6 @@ void engineFaceRange(int mode, int width, int height, int& minFace, int& maxFace
   maxFace = std::min(width, height);
 }
 
-// Wall time by default; with --cpu-time the calling thread's CPU time, which
-// on a machine shared with other jobs leaves out the time the thread waited.
-bool g_threadCpuTime = false;
 struct Clock {
   using time_point = double;
   static double now() {
