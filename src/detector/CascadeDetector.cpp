@@ -316,16 +316,31 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     float scores[kMaxCategories] = {};
     uint32_t const* p = image.data + (window.left + image.stride * window.top);
 
+    // Most common stages update the first score alone; it stays in a register
+    // through them and goes back to the array for the others.
     const int commonCount = static_cast<int>(commonStages.size());
     CascadeStage const* stages = commonStages.data();
     ScaleFeatures::Cursor feature = features->common();
+    float first = 0.0f;
     for (int i = 0; i < commonCount; ++i, feature.next()) {
-        if (stages[i].UpdateScoreAndThreshold(feature.value(p, inverseDeviation), scores)) {
-            *score = scores[0];
+        CascadeStage const& s = stages[i];
+        const float value = feature.value(p, inverseDeviation);
+        bool rejected;
+        if (s.singleScore()) {
+            first += s.binScores[0][s.binOf(value)];
+            rejected = first < s.rejectThreshold[0];
+        } else {
+            scores[0] = first;
+            rejected = s.UpdateScoreAndThreshold(value, scores);
+            first = scores[0];
+        }
+        if (rejected) {
+            *score = first;
             *stage = i;
             return false;
         }
     }
+    scores[0] = first;
 
     const int branches = static_cast<int>(branchStages.size());
     if (branches < 2) {

@@ -37,20 +37,31 @@ public:
     static void scaleFeatures(WindowFeature const* source, WindowFeature* destination, int count, float scale);
     static void destroyStages(CascadeStage* stages);
 
-    // Applies the stage to `scores` (15 floats, zeroed by the caller before
-    // the first stage); true when the window is rejected here.
-    bool UpdateScoreAndThreshold(float value, float* scores) const
+    // The bin of a feature value, 0 for the highest values. Three
+    // comparisons down the tree of thresholds: value >= t[3] picks the half,
+    // then t[1] or t[5] the quarter, then t[0], t[2], t[4] or t[6] the bin.
+    // Written with indices instead of branches, since the branches follow the
+    // image and mispredict; the comparisons are the same, so a NaN still
+    // lands in bin 6.
+    int binOf(float value) const
     {
-        // Three comparisons down the tree of thresholds: value >= t[3] picks
-        // the half, then t[1] or t[5] the quarter, then t[0], t[2], t[4] or
-        // t[6] the bin. Written with indices instead of branches, since the
-        // branches follow the image and mispredict; the comparisons are the
-        // same, so a NaN still lands in bin 6.
         float const* t = binThresholds;
         const int lowerHalf = !(value >= t[3]);
         const int lowerQuarter = !(value >= t[1 + 4 * lowerHalf]);
         const int quarter = 4 * lowerHalf + 2 * lowerQuarter;
-        const int bin = quarter + (value < t[quarter] ? 1 : 0);
+        return quarter + (value < t[quarter] ? 1 : 0);
+    }
+
+    // True when the stage updates one score and doesn't remap: it then only
+    // adds binScores[0][bin] and tests rejectThreshold[0], and a caller may
+    // keep that score in a register (UpdateScoreAndThreshold gives the same).
+    bool singleScore() const { return scoreCount == 1 && remapFlag == 0; }
+
+    // Applies the stage to `scores` (15 floats, zeroed by the caller before
+    // the first stage); true when the window is rejected here.
+    bool UpdateScoreAndThreshold(float value, float* scores) const
+    {
+        const int bin = binOf(value);
         if (remapFlag != 0)
             applyRemap(scores);
         if (scoreCount == 1) {
