@@ -41,10 +41,20 @@ bool ScaleFeatures::build(std::vector<WindowFeature> const& common,
 {
     clear();
     try {
-        std::size_t featureCount = common.size();
+        // Sized once: a photo of a new width lays out every searched scale.
+        std::size_t featureCount = 0;
+        std::size_t rectCount = 0;
+        auto count = [&](std::vector<WindowFeature> const& chain) {
+            featureCount += chain.size();
+            for (WindowFeature const& f : chain)
+                if (f.kind == WindowFeature::HAAR && f.haar != nullptr && f.haar->rects != nullptr)
+                    rectCount += static_cast<std::size_t>(f.haar->count);
+        };
+        count(common);
         for (std::vector<WindowFeature> const& branch : branches)
-            featureCount += branch.size();
+            count(branch);
         features_.reserve(featureCount);
+        rects_.reserve(rectCount);
         for (WindowFeature const& f : common)
             append(f, stride);
         for (std::vector<WindowFeature> const& branch : branches) {
