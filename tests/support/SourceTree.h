@@ -10,6 +10,15 @@
 
 // Paths into the source tree and small file helpers for tests that check
 // generated or embedded data against its source.
+// Set by tests/CMakeLists.txt; other users (the benchmarks) get the working
+// directory and /tmp.
+#ifndef QUORIN_TEST_SOURCE_DIR
+#define QUORIN_TEST_SOURCE_DIR "."
+#endif
+#ifndef QUORIN_TEST_BINARY_DIR
+#define QUORIN_TEST_BINARY_DIR "/tmp"
+#endif
+
 namespace sourcetree {
 
 // The environment may point elsewhere (a copied tree); otherwise the trees the
