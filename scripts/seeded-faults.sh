@@ -106,6 +106,11 @@ while IFS= read -r -d $'\n' l; do
 done < <(awk '/^## fault /{id=$3; getline; sub(/^## */,""); print id "\t" $0}' "$FAULTS")
 
 build() { cmake --build "$BUILD" -j"$JOBS" >"$WORK/build.log" 2>&1; }
+# Tests' temporary files (gtest's TempDir) kept to this run: other suites on
+# the machine write the same names in /tmp, and a torn file would pass for a
+# caught fault.
+export TEST_TMPDIR="$WORK/tmp"
+mkdir -p "$TEST_TMPDIR"
 # Tests that only compile the public headers or install the package can't see
 # a fault in a source file and take half the suite's time: left out. The
 # minutes-long tests run last, so that most faults are caught by a quick test.
