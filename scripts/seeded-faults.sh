@@ -48,14 +48,15 @@ fi
 
 # Sync the tracked files into the copy, touching only those that differ so
 # that the build stays incremental between runs; files gone from the source
-# are removed.
+# are removed. Copies get a fresh time: a file restored after an interrupted
+# run must be rebuilt, though its old time is older than its faulty object.
 sync_tree() {
   (cd "$SRC" && if [ -n "${REV:-}" ]; then find . -type f -printf '%P\0'; else git ls-files -z; fi) |
   while IFS= read -r -d '' f; do
     [ -f "$SRC/$f" ] || continue
     if ! cmp -s "$SRC/$f" "$TREE/$f"; then
       mkdir -p "$(dirname "$TREE/$f")"
-      cp -p "$SRC/$f" "$TREE/$f"
+      cp    "$SRC/$f" "$TREE/$f"
     fi
   done
   (cd "$TREE" && find . -type f -printf '%P\n') | while IFS= read -r f; do
