@@ -13,7 +13,7 @@ ROOT="$(cd "$(dirname "$0")/.." && pwd)"
 BUILD="${QUORIN_BUILD_DIR:-$ROOT/build}"
 CACHE="${QUORIN_DATA_DIR:-$HOME/.cache/quorin}"
 OUT="$ROOT/out"
-PKG_SPEC="tracking@1.1.3"
+PKG="tracking@1.1.3"
 PKG_SHA256="cac8569e3f1e6158a3b1162fe2212a33c671c17f67729ad6a7fa2e35faaa52fb"
 PHOTO="$CACHE/photos/tracking_faces_test.png"
 
@@ -37,9 +37,9 @@ fetch_photo() {
   local tgz="$CACHE/pkg/tracking-1.1.3.tgz" tmp
   if ! [ -f "$tgz" ] || [ "$(sha256sum "$tgz" | cut -d' ' -f1)" != "$PKG_SHA256" ]; then
     tmp="$(mktemp -d "$CACHE/pkg/.demo.XXXXXX")"
-    (cd "$tmp" && npm pack --silent "$PKG_SPEC" >/dev/null) || { rm -rf "$tmp"; say "npm pack $PKG_SPEC failed"; return 1; }
+    (cd "$tmp" && npm pack --silent "$PKG" >/dev/null) || { rm -rf "$tmp"; say "npm pack $PKG failed"; return 1; }
     if [ "$(sha256sum "$tmp/tracking-1.1.3.tgz" | cut -d' ' -f1)" != "$PKG_SHA256" ]; then
-      rm -rf "$tmp"; say "sha256 mismatch for $PKG_SPEC"; return 1
+      rm -rf "$tmp"; say "sha256 mismatch for $PKG"; return 1
     fi
     mv "$tmp/tracking-1.1.3.tgz" "$tgz"; rm -rf "$tmp"
   fi

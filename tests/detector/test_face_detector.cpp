@@ -65,7 +65,7 @@ bool sameCell(const DetectionWindow& w, int left, int top, int right, int bottom
 
 } // namespace
 
-TEST(FaceDetectorConfig, UnknownPostFilterReleasesEverything)
+TEST(FaceDetectorConfig, EveryFailedInitLeavesNothingHalfMade)
 {
     FaceDetectorModels models;
     FaceDetector fd;
@@ -75,21 +75,12 @@ TEST(FaceDetectorConfig, UnknownPostFilterReleasesEverything)
     } catch (const qv_operation_error& e) {
         EXPECT_STREQ(e.what(), "Failed to create PostFilter");
     }
-    TestFrame frame = frameWithFace(40, 40);
-    EXPECT_THROW(run(fd, frame), qv_operation_error) << "nothing may be left half made";
-    EXPECT_THROW(fd.setSearchStep(0.1f, 0.1f), qv_operation_error);
-}
-
-TEST(FaceDetectorConfig, OtherFailuresLeaveNothingBehind)
-{
-    FaceDetectorModels models;
-    FaceDetector fd;
     // A post filter whose model is missing, a malformed or absent description:
     // all the same failure as an unknown name.
-    EXPECT_THROW(fd.init(postFilterConfig("{\"name\":\"ILABS_POSTFILTER\",\"param\":{\"model\":\"fdtest_absent\"}}")),
-                 qv_operation_error);
-    EXPECT_THROW(fd.init(postFilterConfig("[not an object]")), qv_operation_error);
-    EXPECT_THROW(fd.init("{\"detector\":" + detectorConfig("fdtest_cascade") + "}"), qv_operation_error);
+    for (const std::string& text :
+         {postFilterConfig("{\"name\":\"ILABS_POSTFILTER\",\"param\":{\"model\":\"fdtest_absent\"}}"),
+          postFilterConfig("[not an object]"), "{\"detector\":" + detectorConfig("fdtest_cascade") + "}"})
+        EXPECT_THROW(fd.init(text), qv_operation_error) << text;
     // Text and cascade failures pass through as they are.
     EXPECT_ANY_THROW(fd.init("not json"));
     std::string badModel = FaceDetectorModels::config();
@@ -97,6 +88,7 @@ TEST(FaceDetectorConfig, OtherFailuresLeaveNothingBehind)
     EXPECT_ANY_THROW(fd.init(badModel));
     TestFrame frame = frameWithFace(40, 40);
     EXPECT_THROW(run(fd, frame), qv_operation_error);
+    EXPECT_THROW(fd.setSearchStep(0.1f, 0.1f), qv_operation_error);
 }
 
 TEST(FaceDetectorConfig, ReinitReplacesTheEnginesAndDropsTracking)
@@ -163,17 +155,6 @@ TEST(FaceDetectorFrame, BadFramesRaiseCleanly)
     EXPECT_THROW(fd.detect(&pixel, 10, -3, faces), qv_invalid_argument);
 }
 
-TEST(FaceDetectorFrame, FrameSmallerThanTheWindowGivesNoFace)
-{
-    FaceDetectorModels models;
-    FaceDetector fd;
-    fd.init(FaceDetectorModels::config());
-    TestFrame tiny(24, 24, kBright);
-    std::vector<FaceData> faces(2);
-    fd.detect(tiny.pixels.data(), tiny.width, tiny.height, faces);
-    EXPECT_TRUE(faces.empty());
-}
-
 TEST(FaceDetectorWholeFrame, FindsEveryFaceWithRectAndScore)
 {
     FaceDetectorModels models(1.5f);
@@ -204,6 +185,10 @@ TEST(FaceDetectorWholeFrame, ResultListIsResizedToTheFaces)
     EXPECT_EQ(faces.size(), 1u);
     TestFrame empty(kWidth, kHeight);
     fd.detect(empty.pixels.data(), empty.width, empty.height, faces);
+    EXPECT_TRUE(faces.empty());
+    faces.resize(2);
+    TestFrame tiny(24, 24, kBright); // no window fits strictly inside
+    fd.detect(tiny.pixels.data(), tiny.width, tiny.height, faces);
     EXPECT_TRUE(faces.empty());
 }
 
@@ -325,70 +310,40 @@ TEST(FaceDetectorTracking, FaceStartingAnywhereIsFoundWithinTwelveFrames)
         }
 }
 
-TEST(FaceDetectorTracking, MovingFaceKeepsOneTrackWithItsVelocity)
+TEST(FaceDetectorTracking, MovingFaceKeepsOneTrackThatLearnsItsVelocity)
 {
-    FaceDetectorModels models;
-    FaceDetector fd;
-    fd.init(FaceDetectorModels::config());
-    fd.setTrackingMode(QVFaceTrackingMode(1));
-    // Start in cell 0 so the first frame finds it; then move 4 right and 2
-    // down per frame, a step of the spread pattern.
-    int x = 10, y = 10;
-    TestFrame start = frameWithFace(x, y);
-    ASSERT_EQ(run(fd, start).size(), 1u);
-    const Tracker* t = fd.currentTracker();
-    for (int frameNo = 1; frameNo <= 25; ++frameNo) {
-        x += 4;
-        y += 2;
-        TestFrame frame = frameWithFace(x, y);
-        std::vector<FaceData> faces = run(fd, frame);
-        ASSERT_EQ(faces.size(), 1u) << "frame " << frameNo;
-        EXPECT_TRUE(hasRect(faces[0], x, y, x + 24, y + 24)) << "frame " << frameNo;
-        ASSERT_EQ(liveTracks(t), 1);
-        EXPECT_TRUE(t->faces.alive[0]) << "the face keeps its slot";
-        EXPECT_DOUBLE_EQ(t->faces.items[0].velocityX, 4.0);
-        EXPECT_DOUBLE_EQ(t->faces.items[0].velocityY, 2.0);
+    for (int mode : {1, 2}) {
+        FaceDetectorModels models;
+        FaceDetector fd;
+        fd.init(FaceDetectorModels::config());
+        fd.setTrackingMode(QVFaceTrackingMode(mode));
+        // Start in cell 0 so the first frame finds it; then move 4 right and 2
+        // down per frame, a step of the spread pattern.
+        int x = 10, y = 10;
+        TestFrame start = frameWithFace(x, y);
+        ASSERT_EQ(run(fd, start).size(), 1u);
+        const Tracker* t = fd.currentTracker();
+        for (int frameNo = 1; frameNo <= 25; ++frameNo) {
+            x += 4;
+            y += 2;
+            TestFrame frame = frameWithFace(x, y);
+            std::vector<FaceData> faces = run(fd, frame);
+            ASSERT_EQ(faces.size(), 1u) << "mode " << mode << " frame " << frameNo;
+            EXPECT_TRUE(hasRect(faces[0], x, y, x + 24, y + 24)) << "mode " << mode << " frame " << frameNo;
+            ASSERT_EQ(liveTracks(t), 1);
+        }
+        EXPECT_EQ(t->frameCounter, 26u);
+        if (const KFTracker* kf = dynamic_cast<const KFTracker*>(t)) {
+            ASSERT_TRUE(kf->kfFaces.alive[0]);
+            EXPECT_NEAR(kf->kfFaces.items[0].state[4], 4.0f, 0.2f);
+            EXPECT_NEAR(kf->kfFaces.items[0].state[5], 2.0f, 0.2f);
+            EXPECT_NEAR(kf->kfFaces.items[0].state[0], float(x), 1.0f);
+        } else {
+            EXPECT_TRUE(t->faces.alive[0]) << "the face keeps its slot";
+            EXPECT_DOUBLE_EQ(t->faces.items[0].velocityX, 4.0);
+            EXPECT_DOUBLE_EQ(t->faces.items[0].velocityY, 2.0);
+        }
     }
-    EXPECT_EQ(t->frameCounter, 26u);
-}
-
-TEST(FaceDetectorTracking, KalmanTrackLearnsTheMotion)
-{
-    FaceDetectorModels models;
-    FaceDetector fd;
-    fd.init(FaceDetectorModels::config());
-    fd.setTrackingMode(QVFaceTrackingMode(2));
-    int x = 10, y = 10;
-    TestFrame start = frameWithFace(x, y);
-    ASSERT_EQ(run(fd, start).size(), 1u);
-    const KFTracker* kf = dynamic_cast<const KFTracker*>(fd.currentTracker());
-    ASSERT_NE(kf, nullptr);
-    for (int frameNo = 1; frameNo <= 25; ++frameNo) {
-        x += 4;
-        y += 2;
-        TestFrame frame = frameWithFace(x, y);
-        std::vector<FaceData> faces = run(fd, frame);
-        ASSERT_EQ(faces.size(), 1u) << "frame " << frameNo;
-        EXPECT_TRUE(hasRect(faces[0], x, y, x + 24, y + 24)) << "frame " << frameNo;
-    }
-    ASSERT_TRUE(kf->kfFaces.alive[0]);
-    EXPECT_NEAR(kf->kfFaces.items[0].state[4], 4.0f, 0.2f);
-    EXPECT_NEAR(kf->kfFaces.items[0].state[5], 2.0f, 0.2f);
-    EXPECT_NEAR(kf->kfFaces.items[0].state[0], float(x), 1.0f);
-}
-
-TEST(FaceDetectorTracking, VanishedFaceIsDroppedAtOnce)
-{
-    FaceDetectorModels models;
-    FaceDetector fd;
-    fd.init(FaceDetectorModels::config());
-    fd.setTrackingMode(QVFaceTrackingMode(1));
-    TestFrame frame = frameWithFace(10, 10);
-    ASSERT_EQ(run(fd, frame).size(), 1u);
-    TestFrame empty(kWidth, kHeight);
-    EXPECT_TRUE(run(fd, empty).empty());
-    EXPECT_EQ(liveTracks(fd.currentTracker()), 0);
-    EXPECT_EQ(fd.currentTracker()->frameCounter, 2u);
 }
 
 TEST(FaceDetectorTracking, SpreadHitsAreTrustedWithoutThePostFilter)
@@ -419,21 +374,28 @@ TEST(FaceDetectorTracking, SpreadHitsAreTrustedWithoutThePostFilter)
     }
 }
 
-TEST(FaceDetectorTracking, ModeChangesDiscardKnownFaces)
+TEST(FaceDetectorTracking, VanishedFacesAndModeChangesDropTheTracks)
 {
     FaceDetectorModels models;
     FaceDetector fd;
     fd.init(FaceDetectorModels::config());
-    fd.setTrackingMode(QVFaceTrackingMode(2));
-    TestFrame frame = frameWithFace(90, 46);
-    for (int k = 0; k < 8; ++k) run(fd, frame);
-    ASSERT_EQ(liveTracks(fd.currentTracker()), 1);
+    fd.setTrackingMode(QVFaceTrackingMode(1));
+    TestFrame frame = frameWithFace(10, 10);
+    ASSERT_EQ(run(fd, frame).size(), 1u);
+    TestFrame empty(kWidth, kHeight);
+    EXPECT_TRUE(run(fd, empty).empty());
+    EXPECT_EQ(liveTracks(fd.currentTracker()), 0) << "dropped at once";
+    EXPECT_EQ(fd.currentTracker()->frameCounter, 2u);
 
+    fd.setTrackingMode(QVFaceTrackingMode(2));
+    TestFrame elsewhere = frameWithFace(90, 46);
+    for (int k = 0; k < 8; ++k) run(fd, elsewhere);
+    ASSERT_EQ(liveTracks(fd.currentTracker()), 1);
     fd.setTrackingMode(QVFaceTrackingMode(2));
     ASSERT_NE(fd.currentTracker(), nullptr);
     EXPECT_EQ(fd.currentTracker()->frameCounter, 0u);
     EXPECT_EQ(liveTracks(fd.currentTracker()), 0);
-    EXPECT_TRUE(run(fd, frame).empty()) << "back to searching cell 0";
+    EXPECT_TRUE(run(fd, elsewhere).empty()) << "back to searching cell 0";
 }
 
 TEST(FaceDetectorTracking, ModesOutsideOneToFourMeanTrackingOff)

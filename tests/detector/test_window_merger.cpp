@@ -60,33 +60,57 @@ TEST(WindowMergerGroups, LoneHitKeepsItsRectangleAndNormalisedLogisticCategories
     EXPECT_NEAR(out[0].categoryScores[7], 0.5f / total, 1e-6);
 }
 
-TEST(WindowMergerGroups, OverlappingHitsMergeToTheMeanRectangleAndTheBestScore)
+// Grouping (Dice above 0.4 joins), the mean rectangle rounded half up, and
+// suppression (overlap over the smaller area above 0.4: the lower score goes).
+TEST(WindowMergerGroups, RectanglesAndScoresOfTheSurvivors)
 {
-    const auto out = merge({hit(10, 10, 40, 40, 1.0f, 0), hit(12, 10, 42, 40, 3.0f, 1), hit(14, 13, 44, 43, 2.0f, 0)});
-    ASSERT_EQ(out.size(), 1u);
-    EXPECT_TRUE(sameWindow(out[0].window, makeWindow(12, 11, 42, 41)));
-    EXPECT_EQ(out[0].score, 3.0f);
-    EXPECT_EQ(out[0].category, 1); // of the member that set the best score
-}
-
-TEST(WindowMergerGroups, IdenticalWindowsFormOneGroup)
-{
-    const auto out = merge({hit(0, 0, 24, 24, 1.0f), hit(0, 0, 24, 24, 4.0f)});
-    ASSERT_EQ(out.size(), 1u);
-    EXPECT_EQ(out[0].score, 4.0f);
-}
-
-TEST(WindowMergerGroups, MeanRectangleRoundsHalfUp)
-{
-    const auto out = merge({hit(10, 10, 40, 40, 1.0f), hit(11, 11, 41, 41, 1.0f)});
-    ASSERT_EQ(out.size(), 1u);
-    EXPECT_TRUE(sameWindow(out[0].window, makeWindow(11, 11, 41, 41)));
-}
-
-TEST(WindowMergerGroups, TouchingAndDistantWindowsStayApart)
-{
-    const auto out = merge({hit(0, 0, 20, 20, 1.0f), hit(20, 0, 40, 20, 2.0f), hit(100, 100, 120, 120, 3.0f)});
-    EXPECT_EQ(out.size(), 3u);
+    struct Case {
+        const char* what;
+        std::vector<ScoredWindow> input;
+        std::vector<DetectionWindow> windows; // in output order
+        std::vector<float> scores;
+    };
+    const std::vector<Case> cases = {
+        {"overlapping hits: mean rectangle, best score",
+         {hit(10, 10, 40, 40, 1.0f, 0), hit(12, 10, 42, 40, 3.0f, 1), hit(14, 13, 44, 43, 2.0f, 0)},
+         {makeWindow(12, 11, 42, 41)},
+         {3.0f}},
+        {"identical windows", {hit(0, 0, 24, 24, 1.0f), hit(0, 0, 24, 24, 4.0f)}, {makeWindow(0, 0, 24, 24)}, {4.0f}},
+        {"mean rounds half up", {hit(10, 10, 40, 40, 1.0f), hit(11, 11, 41, 41, 1.0f)}, {makeWindow(11, 11, 41, 41)},
+         {1.0f}},
+        {"touching and distant stay apart",
+         {hit(0, 0, 20, 20, 1.0f), hit(20, 0, 40, 20, 2.0f), hit(100, 100, 120, 120, 3.0f)},
+         {makeWindow(100, 100, 120, 120), makeWindow(20, 0, 40, 20), makeWindow(0, 0, 20, 20)},
+         {3.0f, 2.0f, 1.0f}},
+        // Dice 2 * 576 / (576 + 10000) is below 0.4: two groups, then the
+        // overlap over the smaller area is 1.
+        {"small inside large, small better", {hit(0, 0, 100, 100, 1.0f), hit(30, 30, 54, 54, 2.0f)},
+         {makeWindow(30, 30, 54, 54)}, {2.0f}},
+        {"small inside large, large better", {hit(0, 0, 100, 100, 3.0f), hit(30, 30, 54, 54, 2.0f)},
+         {makeWindow(0, 0, 100, 100)}, {3.0f}},
+        // Sorted by descending left, the window starting at 30 comes first.
+        {"equal scores keep the earlier", {hit(0, 0, 100, 100, 2.0f), hit(30, 30, 54, 54, 2.0f)},
+         {makeWindow(30, 30, 54, 54)}, {2.0f}},
+        {"zero area dropped uncompared", {hit(50, 50, 50, 80, 9.0f), hit(0, 0, 20, 20, 1.0f)},
+         {makeWindow(0, 0, 20, 20)}, {1.0f}},
+        // A(60..) beats its neighbour B(55..), erasing the entry right behind
+        // it, so the walk ends after A's pass: C and D, which overlap each other
+        // but not A, both survive.
+        {"walk ends early after an erase",
+         {hit(60, 0, 90, 30, 5.0f), hit(55, 5, 70, 20, 1.0f), hit(0, 100, 30, 130, 2.0f), hit(5, 105, 20, 120, 1.0f)},
+         {makeWindow(60, 0, 90, 30), makeWindow(5, 105, 20, 120), makeWindow(0, 100, 30, 130)},
+         {5.0f, 1.0f, 2.0f}},
+    };
+    for (const Case& c : cases) {
+        const auto out = merge(c.input);
+        ASSERT_EQ(out.size(), c.windows.size()) << c.what;
+        for (size_t i = 0; i < out.size(); ++i) {
+            EXPECT_TRUE(sameWindow(out[i].window, c.windows[i])) << c.what << " #" << i;
+            EXPECT_EQ(out[i].score, c.scores[i]) << c.what << " #" << i;
+        }
+    }
+    EXPECT_EQ(merge({hit(10, 10, 40, 40, 1.0f, 0), hit(12, 10, 42, 40, 3.0f, 1)})[0].category, 1)
+        << "the category of the member that set the best score";
 }
 
 TEST(WindowMergerGroups, CategoryBlendFollowsRecordSettersWeightedByTheirOwnScore)
@@ -108,43 +132,6 @@ TEST(WindowMergerGroups, CategoryBlendFollowsRecordSettersWeightedByTheirOwnScor
     const float total = c0 + c1 + 13 * rest;
     EXPECT_NEAR(out[0].categoryScores[0], c0 / total, 1e-5);
     EXPECT_NEAR(out[0].categoryScores[1], c1 / total, 1e-5);
-}
-
-TEST(WindowMergerSuppression, SmallWindowInsideALargeOneLosesToTheBetterScore)
-{
-    // Dice 2 * 576 / (576 + 10000) is below 0.4: two groups; the overlap over
-    // the smaller area is 1: the lower score goes, whatever its size.
-    auto out = merge({hit(0, 0, 100, 100, 1.0f), hit(30, 30, 54, 54, 2.0f)});
-    ASSERT_EQ(out.size(), 1u);
-    EXPECT_TRUE(sameWindow(out[0].window, makeWindow(30, 30, 54, 54)));
-    out = merge({hit(0, 0, 100, 100, 3.0f), hit(30, 30, 54, 54, 2.0f)});
-    ASSERT_EQ(out.size(), 1u);
-    EXPECT_TRUE(sameWindow(out[0].window, makeWindow(0, 0, 100, 100)));
-}
-
-TEST(WindowMergerSuppression, EqualScoresKeepTheEarlierWindow)
-{
-    // Sorted by descending left, the window starting at 30 comes first.
-    const auto out = merge({hit(0, 0, 100, 100, 2.0f), hit(30, 30, 54, 54, 2.0f)});
-    ASSERT_EQ(out.size(), 1u);
-    EXPECT_TRUE(sameWindow(out[0].window, makeWindow(30, 30, 54, 54)));
-}
-
-TEST(WindowMergerSuppression, ZeroAreaWindowsAreDroppedUncompared)
-{
-    const auto out = merge({hit(50, 50, 50, 80, 9.0f), hit(0, 0, 20, 20, 1.0f)});
-    ASSERT_EQ(out.size(), 1u);
-    EXPECT_TRUE(sameWindow(out[0].window, makeWindow(0, 0, 20, 20)));
-}
-
-TEST(WindowMergerSuppression, WalkEndsEarlyWhenTheNextWindowIsErased)
-{
-    // Groups after sorting: A(60..) beats its neighbour B(40..), erasing the
-    // entry right behind it, so the walk ends after A's pass: C and D, which
-    // overlap each other but not A, both survive.
-    const auto out = merge({hit(60, 0, 90, 30, 5.0f), hit(55, 5, 70, 20, 1.0f), hit(0, 100, 30, 130, 2.0f),
-                            hit(5, 105, 20, 120, 1.0f)});
-    EXPECT_EQ(out.size(), 3u);
 }
 
 TEST(WindowMergerReuse, CallsDoNotLeakIntoEachOther)

@@ -81,11 +81,10 @@ TEST(ILabsJudgement, HistogramIsTakenOnTheScaledPatchRowByRow)
     EXPECT_EQ(out.size(), 1u);
 }
 
-TEST(ILabsConfiguration, NameJsonAndModelOfAnotherFeatureLength)
+TEST(ILabsConfiguration, JsonAndModelOfAnotherFeatureLength)
 {
     ScopedModel model("pf_ilabs_json", ilabsThresholdModel(0, {0.0f}));
     ILabsPostFilter f;
-    EXPECT_EQ(f.name(), "ILABS_POSTFILTER");
     f.fromJson("{}");
     EXPECT_EQ(f.getClassifier().categoryCount(), 0);
     f.fromJson("{ \"model\" : \"pf_ilabs_json\" }");

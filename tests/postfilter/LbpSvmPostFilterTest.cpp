@@ -72,14 +72,13 @@ TEST(LbpSvmJudgement, HistogramIsTakenOnTheTransposedPatch)
     EXPECT_EQ(run(LbpSvmPostFilter("pf_svm_t03"), {hit(1.0f, 0)}).size(), 0u);
 }
 
-TEST(LbpSvmConfiguration, NameJsonAndModelOfAnotherLength)
+TEST(LbpSvmConfiguration, JsonAndModelOfAnotherLength)
 {
     postfilterwriters::SvmModelParams shortModel = svmThresholdModel(0, 0.0f);
     shortModel.featureLength = 10;
     shortModel.supportVectors[0].resize(10);
     ScopedModel m = serve("pf_svm_short", shortModel, shortModel);
     LbpSvmPostFilter f;
-    EXPECT_EQ(f.name(), "LBP_SVM_POSTFILTER");
     f.fromJson("{\"model\":\"pf_svm_short\"}");
     EXPECT_EQ(f.toJson(), "{\"model\":\"pf_svm_short\"}");
     EXPECT_THROW(run(f, {hit(1.0f, 1)}), qv_data_error);

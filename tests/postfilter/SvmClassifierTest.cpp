@@ -35,7 +35,7 @@ SvmClassifier::SvmModel toModel(const SvmModelParams& s)
 // Two classes, kernel (0.5 x.s + 1)^2; class 0 owns (1,0) and (0,1), class 1
 // owns (1,1). For the feature (2, 4) the kernel values are 4, 9, 16 and
 //   sum = 0.5 * 4 - 1 * 9 + 0.25 * 16 - rho(0.5) = -3.5.
-SvmModelParams twoClassSpec(float threshold)
+SvmModelParams twoClassParams(float threshold)
 {
     SvmModelParams s;
     s.degree = 2;
@@ -56,7 +56,7 @@ SvmModelParams twoClassSpec(float threshold)
 //   pair (0,1): c[0][0]*1 + c[0][1]*2 = 1 - 2  = -1 -> class 1
 //   pair (0,2): c[1][0]*1 + c[0][2]*3 = -5 + 6 = 1  -> class 0
 //   pair (1,2): c[1][1]*2 + c[1][2]*3 = 6 - 6  = 0  -> class 2 (not strictly above)
-SvmModelParams threeClassSpec(std::vector<float> rho)
+SvmModelParams threeClassParams(std::vector<float> rho)
 {
     SvmModelParams s;
     s.classCount = 3;
@@ -89,7 +89,7 @@ TEST(SvmArithmetic, PowiDotAndKernel)
     const float a[2] = {1, 2};
     EXPECT_EQ(SvmClassifier::dot(a, a, 0), 0.0f);
     EXPECT_EQ(SvmClassifier::dot(a, a, 2), 5.0f);
-    SvmClassifier::SvmModel m = toModel(twoClassSpec(0));
+    SvmClassifier::SvmModel m = toModel(twoClassParams(0));
     const float f[2] = {2, 4};
     EXPECT_EQ(SvmClassifier::kernelFunction(f, {1, 1}, m), 16.0f);
     m.kernelType = 2;
@@ -98,18 +98,18 @@ TEST(SvmArithmetic, PowiDotAndKernel)
 
 TEST(SvmDecision, TwoClassesHangOnTheOneThresholdStrictly)
 {
-    EXPECT_EQ(classifyWith(twoClassSpec(-4.0f), {2, 4}), 7); // -3.5 > -4: class 0
-    EXPECT_EQ(classifyWith(twoClassSpec(-3.5f), {2, 4}), 9); // equal is not above
-    SvmModelParams other = twoClassSpec(-1.0f);
+    EXPECT_EQ(classifyWith(twoClassParams(-4.0f), {2, 4}), 7); // -3.5 > -4: class 0
+    EXPECT_EQ(classifyWith(twoClassParams(-3.5f), {2, 4}), 9); // equal is not above
+    SvmModelParams other = twoClassParams(-1.0f);
     other.kernelType = 0; // kernel values 0: only rho and the threshold decide
     EXPECT_EQ(classifyWith(other, {2, 4}), 7);                // -0.5 > -1
 }
 
 TEST(SvmDecision, PairSumsTakeTheCoefficientRowsCrosswiseAndTiesGoLow)
 {
-    EXPECT_EQ(classifyWith(threeClassSpec({0, 0, 0}), {1, 2, 3}), 10);     // 1:1:1, tie to class 0
-    EXPECT_EQ(classifyWith(threeClassSpec({0, 2, 0}), {1, 2, 3}), 30);     // pair (0,2) now -1
-    EXPECT_EQ(classifyWith(threeClassSpec({0, 0, -0.5f}), {1, 2, 3}), 20); // pair (1,2) now 0.5
+    EXPECT_EQ(classifyWith(threeClassParams({0, 0, 0}), {1, 2, 3}), 10);     // 1:1:1, tie to class 0
+    EXPECT_EQ(classifyWith(threeClassParams({0, 2, 0}), {1, 2, 3}), 30);     // pair (0,2) now -1
+    EXPECT_EQ(classifyWith(threeClassParams({0, 0, -0.5f}), {1, 2, 3}), 20); // pair (1,2) now 0.5
     SvmModelParams single;
     single.classCount = 1;
     single.labels = {4};
@@ -123,7 +123,7 @@ TEST(SvmDecision, WrongFeatureLengthOrNoModelIsRefused)
     SvmClassifier c;
     const float f[3] = {1, 2, 3};
     EXPECT_THROW(c.classify(f, 2), qv_unsupported_error);
-    c.setModel(toModel(twoClassSpec(0)));
+    c.setModel(toModel(twoClassParams(0)));
     try {
         c.classify(f, 3);
         FAIL() << "no exception";
@@ -134,9 +134,9 @@ TEST(SvmDecision, WrongFeatureLengthOrNoModelIsRefused)
 
 TEST(SvmModelLoad, ExpandsSparseVectorsAndReadsTwoModelsInSequence)
 {
-    SvmModelParams second = threeClassSpec({0, 2, 0});
+    SvmModelParams second = threeClassParams({0, 2, 0});
     second.supportVectors[1] = {0, 0.75f, -2.5f};
-    ScopedModel model("pf_svm_pair", postfilterwriters::svmModelPayload(twoClassSpec(-4.0f), second));
+    ScopedModel model("pf_svm_pair", postfilterwriters::svmModelPayload(twoClassParams(-4.0f), second));
     ModelReader reader("pf_svm_pair", ModelReader::RAW);
     SvmClassifier a(reader);
     SvmClassifier b(reader);
@@ -152,7 +152,7 @@ TEST(SvmModelLoad, ExpandsSparseVectorsAndReadsTwoModelsInSequence)
 
 TEST(SvmModelLoad, EveryTruncationIsADataError)
 {
-    std::vector<uint8_t> full = postfilterwriters::svmModelPayload(twoClassSpec(0), threeClassSpec({0, 0, 0}));
+    std::vector<uint8_t> full = postfilterwriters::svmModelPayload(twoClassParams(0), threeClassParams({0, 0, 0}));
     for (std::size_t n = 0; n < full.size(); ++n) {
         ScopedModel model("pf_svm_cut", std::vector<uint8_t>(full.begin(), full.begin() + n));
         ModelReader reader("pf_svm_cut", ModelReader::RAW);
@@ -172,7 +172,7 @@ TEST(SvmModelLoad, RejectsInconsistentModels)
         SvmClassifier c(reader);
     };
     auto broken = [&](void (*edit)(SvmModelParams&)) {
-        SvmModelParams s = twoClassSpec(0);
+        SvmModelParams s = twoClassParams(0);
         edit(s);
         postfilterwriters::ByteWriter w;
         postfilterwriters::writeSvmModel(w, s);
@@ -186,7 +186,7 @@ TEST(SvmModelLoad, RejectsInconsistentModels)
     EXPECT_THROW(broken([](SvmModelParams& s) { s.supportVectors[2] = {1, 1, 1}; }), qv_data_error); // column 3
     {   // Counts claiming two vectors while an entry sits in row 3.
         postfilterwriters::ByteWriter w;
-        postfilterwriters::writeSvmModel(w, twoClassSpec(0));
+        postfilterwriters::writeSvmModel(w, twoClassParams(0));
         std::vector<uint8_t> bytes = w.bytes();
         for (int at : {40, 44, 48}) // svCounts {1, 1}, svTotal 2
             bytes[at] = at == 48 ? 2 : 1;

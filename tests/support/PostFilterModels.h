@@ -16,6 +16,7 @@
 
 #include "PostFilterWriters.h"
 #include "image/ScoredWindow.h"
+#include "support/SourceTree.h"
 
 namespace pftest {
 
@@ -94,10 +95,9 @@ inline void writeFile(const std::string& path, const std::vector<uint8_t>& bytes
     out.write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
 }
 
-// True when tools/ilabs_feature.py can run (system Python with numpy, source dir known).
+// True when tools/ilabs_feature.py can run (system Python with numpy).
 inline bool featureMirrorAvailable() {
-    return std::getenv("QUORIN_SOURCE_DIR") != nullptr &&
-           std::system("/usr/bin/python3 -c 'import numpy' >/dev/null 2>&1") == 0;
+    return std::system("/usr/bin/python3 -c 'import numpy' >/dev/null 2>&1") == 0;
 }
 
 // " --hit=L,R,T,B,SCORE,CATEGORY" for each hit, scores printed to round-trip.
@@ -113,9 +113,7 @@ inline std::string hitArguments(const std::vector<ScoredWindow>& hits) {
 // Runs tools/ilabs_feature.py with `args` and returns its output lines.
 inline std::vector<std::string> runFeatureMirror(const std::string& args) {
     std::vector<std::string> lines;
-    const char* source = std::getenv("QUORIN_SOURCE_DIR");
-    if (source == nullptr) return lines;
-    FILE* pipe = popen(("/usr/bin/python3 " + std::string(source) + "/tools/ilabs_feature.py " + args).c_str(), "r");
+    FILE* pipe = popen(("/usr/bin/python3 " + sourcetree::path("tools/ilabs_feature.py") + " " + args).c_str(), "r");
     if (pipe == nullptr) return lines;
     std::string text;
     char chunk[4096];

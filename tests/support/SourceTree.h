@@ -10,11 +10,27 @@
 
 // Paths into the source tree and small file helpers for tests that check
 // generated or embedded data against its source.
+// Set by tests/CMakeLists.txt; other users (the benchmarks) get the working
+// directory and /tmp.
+#ifndef QUORIN_TEST_SOURCE_DIR
+#define QUORIN_TEST_SOURCE_DIR "."
+#endif
+#ifndef QUORIN_TEST_BINARY_DIR
+#define QUORIN_TEST_BINARY_DIR "/tmp"
+#endif
+
 namespace sourcetree {
 
+// The environment may point elsewhere (a copied tree); otherwise the trees the
+// tests were configured in.
 inline std::string root() {
     const char* dir = std::getenv("QUORIN_SOURCE_DIR");
-    return dir ? std::string(dir) : std::string(".");
+    return dir ? std::string(dir) : std::string(QUORIN_TEST_SOURCE_DIR);
+}
+
+inline std::string binaryRoot() {
+    const char* dir = std::getenv("QUORIN_BINARY_DIR");
+    return dir ? std::string(dir) : std::string(QUORIN_TEST_BINARY_DIR);
 }
 
 inline std::string path(const std::string& relative) { return root() + "/" + relative; }
@@ -34,10 +50,9 @@ inline void writeText(const std::string& file, const std::string& text) {
     out << text;
 }
 
-// A fresh scratch directory under the build tree (or /tmp).
+// A fresh scratch directory under the build tree (or /tmp when it can't be made).
 inline std::string scratchDir(const std::string& name) {
-    const char* build = std::getenv("QUORIN_BINARY_DIR");
-    const std::string dir = std::string(build ? build : "/tmp") + "/test-scratch/" + name;
+    const std::string dir = binaryRoot() + "/test-scratch/" + name;
     const std::string command = "rm -rf '" + dir + "' && mkdir -p '" + dir + "'";
     if (std::system(command.c_str()) != 0) return "/tmp";
     return dir;
