@@ -30,6 +30,13 @@ void parseFrameSize(const std::string& text, int maxSide, int& width, int& heigh
                      "'");
 }
 
+int trackerModeFromName(const std::string& name) {
+  const char* const names[] = {"simple", "kf", "pf", "cpf"};
+  for (int i = 0; i < 4; ++i)
+    if (name == names[i]) return i + 1;
+  return 0;
+}
+
 Options parseOptions(const std::vector<std::string>& args) {
   Options o;
   bool modeGiven = false;
@@ -89,6 +96,10 @@ Options parseOptions(const std::vector<std::string>& args) {
     } else if (arg == "--jvw") {
       o.jvwPath = takeValue();
       if (o.jvwPath.empty()) throw UsageError("--jvw needs a file name");
+    } else if (arg == "--tracker") {
+      std::string v = takeValue();
+      o.tracker = trackerModeFromName(v);
+      if (o.tracker == 0) throw UsageError("--tracker wants simple, kf, pf or cpf, not '" + v + "'");
     } else if (arg == "--") {
       for (++i; i < args.size(); ++i) o.images.push_back(args[i]);
     } else if (arg.size() > 1 && arg[0] == '-') {
@@ -109,6 +120,9 @@ Options parseOptions(const std::vector<std::string>& args) {
     throw UsageError("annotating with --360 needs --scaled (only scaled results are on the frame's own axes)");
   if (o.search360 && !o.scaled && !o.jvwPath.empty())
     throw UsageError("--jvw with --360 needs --scaled (only scaled results are on the frame's own axes)");
+  if (o.tracker != 0 && !o.raw) throw UsageError("--tracker is for --raw streams");
+  if (o.tracker != 0 && (o.search360 || o.scaled || modeGiven || o.rotation != 0))
+    throw UsageError("--tracker runs the tracking mode on upright frames; drop --360, --scaled, --mode and --rotation");
   if (!o.jvwPath.empty() && (o.jvwPath == o.jsonPath || o.jvwPath == o.annotatePath))
     throw UsageError("--jvw needs a file of its own");
   return o;
@@ -142,6 +156,11 @@ Options:
                      quorin_detect360High, --raw uses quorin_detect360Tracking;
                      with --scaled the Scaled entries, and the stream reports
                      the orientation found
+  --tracker NAME     with --raw: follow faces with simple, kf (Kalman), pf
+                     (particle) or cpf (cascade particle) through the library's
+                     FaceDetector class instead of the C API (whose tracking
+                     mode is Kalman); frames as the tracking mode takes them,
+                     upright only; faces carry rectangles, landmarks are 0
   --max-faces N      report at most N faces (1..100, default 100)
   --annotate OUT.png draw rectangles and landmarks onto the image (one image)
   --annotate-raw     with --raw: write the frames, annotated, to stdout

@@ -26,6 +26,7 @@ struct Options {
   bool annotateRaw = false;
   std::string jsonPath;
   std::string jvwPath;
+  int tracker = 0;  // 1..4: --tracker, the raw path through FaceDetector; 0: the C API
   std::vector<std::string> images;
 
   int effectiveMode() const { return mode >= 0 ? mode : (raw ? 1 : 2); }
@@ -37,6 +38,9 @@ Options parseOptions(const std::vector<std::string>& args);
 
 // Parses "WxH" with both sides in 1..maxSide; throws UsageError otherwise.
 void parseFrameSize(const std::string& text, int maxSide, int& width, int& height);
+
+// "simple", "kf", "pf", "cpf" to the tracking modes 1..4; 0 for anything else.
+int trackerModeFromName(const std::string& name);
 
 std::string usageText();
 

@@ -1,5 +1,6 @@
 // quorin-detect: finds faces in JPEG, PNG and PGM images, or in a stream of raw
-// gray video frames on stdin, through the public C API of libquorinapi, and
+// gray video frames on stdin, through the public C API of libquorinapi (or,
+// with --tracker, its exported FaceDetector class), and
 // prints one JSON line per image or frame. It can draw what it found onto the
 // image (--annotate) or onto the frames it passes on (--annotate-raw). Run it
 // with --help for the options and the output format.
@@ -22,6 +23,7 @@
 #include "JvwOutput.h"
 #include "Options.h"
 #include "RawStream.h"
+#include "TrackerSession.h"
 
 namespace {
 
@@ -63,6 +65,7 @@ int worse(int a, int b) { return a > b ? a : b; }
 
 int runImages(const Options& o, JsonSink& json, JvwOutput* jvw) {
   std::unique_ptr<EngineSession> engine;
+  std::unique_ptr<TrackerSession> tracked;  // --tracker: FaceDetector instead of the C API
   const Entry entry = chooseEntry(o);
   int status = kOk;
   for (const std::string& path : o.images) {
@@ -156,6 +159,7 @@ int runRaw(const Options& o, JsonSink& json, JvwOutput* jvw) {
   // The session opens with the first whole frame, so a wrong size or an empty
   // stream is reported without waiting for the models to load.
   std::unique_ptr<EngineSession> engine;
+  std::unique_ptr<TrackerSession> tracked;  // --tracker: FaceDetector instead of the C API
   const Entry entry = chooseEntry(o);
   RawFrameReader reader(stdin, width, height);
   std::vector<std::uint8_t> frame, work;
@@ -185,16 +189,24 @@ int runRaw(const Options& o, JsonSink& json, JvwOutput* jvw) {
     work = frame;  // the engine may write its turned frame into what it gets
     FrameResult result;
     auto t0 = std::chrono::steady_clock::now();
-    if (!engine) {
+    if (!engine && !tracked) {
       try {
-        engine = std::make_unique<EngineSession>(o);
+        if (o.tracker != 0)
+          tracked = std::make_unique<TrackerSession>(static_cast<QVFaceTrackingMode>(o.tracker));
+        else
+          engine = std::make_unique<EngineSession>(o);
       } catch (const EngineError& e) {
         complain(e.what());
         return kEngineFailed;
       }
     }
     try {
-      result = engine->detect(work, width, height);
+      if (tracked) {
+        result = tracked->detect(work, width, height);
+        if (result.faces.size() > static_cast<std::size_t>(o.maxFaces)) result.faces.resize(o.maxFaces);
+      } else {
+        result = engine->detect(work, width, height);
+      }
     } catch (const EngineError& e) {
       progress.finish(frames, lastFaces, engineMs);
       complain("frame " + std::to_string(frames) + ": " + e.what());

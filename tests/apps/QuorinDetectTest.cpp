@@ -8,6 +8,7 @@
 #include <climits>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <fstream>
 #include <random>
 #include <sstream>
@@ -30,6 +31,7 @@
 #include "support/DevData.h"
 #include "Options.h"
 #include "RawStream.h"
+#include "TrackerSession.h"
 
 using namespace qcli;
 
@@ -242,6 +244,7 @@ TEST(OptionParsing, RefusesBadValues) {
            {"--raw", "0x10"},               {"--raw", "10x"},               {"--raw", "x10"},
            {"--raw", "99999x10"},           {"--raw", "10x10x10"},          {"--raw", "99999999999999x1"},
            {"--mode"},                      {"--bogus", "a.png"},           {"--scaled=1", "a.png"},
+           {"--tracker", "KF", "--raw", "8x8"}, {"--tracker", "", "--raw", "8x8"}, {"--tracker"},
        }) {
     EXPECT_THROW(parseOptions(args), UsageError) << args[0] << " " << (args.size() > 1 ? args[1] : "");
   }
@@ -261,9 +264,16 @@ TEST(OptionParsing, RefusesContradictions) {
            {"--jvw", "", "a.png"},
            {"--360", "--jvw", "f.jvw", "a.png"},
            {"--jvw", "f.txt", "--json", "f.txt", "a.png"},
+           {"--tracker", "kf", "a.png"},
+           {"--tracker", "pf", "--raw", "8x8", "--360"},
+           {"--tracker", "pf", "--raw", "8x8", "--scaled"},
+           {"--tracker", "cpf", "--raw", "8x8", "--mode", "1"},
+           {"--tracker", "simple", "--raw", "8x8", "--rotation", "90"},
        }) {
     EXPECT_THROW(parseOptions(args), UsageError) << ::testing::PrintToString(args);
   }
+  EXPECT_EQ(parseOptions({"--tracker=cpf", "--raw", "8x8"}).tracker, 4);
+  EXPECT_EQ(parseOptions({"--raw", "8x8", "--tracker", "simple", "--rotation", "0"}).tracker, 1);
   EXPECT_NO_THROW(parseOptions({"--360", "--scaled", "--annotate", "o.png", "a.png"}));
   EXPECT_EQ(parseOptions({"--jvw=f.jvw", "--raw", "8x8"}).jvwPath, "f.jvw");
   EXPECT_TRUE(parseOptions({"--help", "--bogus"}).help);
@@ -532,6 +542,78 @@ TEST(CommandLine, AnnotatedRawFramesKeepTheStreamSize) {
   EXPECT_EQ(r.out.size(), frames.size());
   std::string lines = readText(json);
   EXPECT_EQ(std::count(lines.begin(), lines.end(), '\n'), 2);
+}
+
+// The rectangles of each JSON line of a raw run, as left, top, right, bottom.
+std::vector<std::vector<std::vector<long long>>> rectsPerLine(const std::string& out) {
+  std::vector<std::vector<std::vector<long long>>> lines;
+  std::istringstream in(out);
+  std::string line;
+  while (std::getline(in, line)) {
+    lines.emplace_back();
+    for (std::size_t at = line.find("\"rect\""); at != std::string::npos; at = line.find("\"rect\"", at + 1)) {
+      std::vector<long long> r;
+      std::size_t p = at;
+      for (const char* key : {"\"left\":", "\"top\":", "\"right\":", "\"bottom\":"}) {
+        p = line.find(key, p) + std::strlen(key);
+        r.push_back(std::atoll(line.c_str() + p));
+      }
+      lines.back().push_back(r);
+    }
+  }
+  return lines;
+}
+
+TEST(TrackerOption, FindsTheConfigurationObjectInTheLibrarysText) {
+  struct Case {
+    const char* text;
+    const char* expected;
+  };
+  const Case cases[] = {
+      {R"({"detection":{"faceRects":{"a":{"b":1}},"faceParts":{}}})", R"({"a":{"b":1}})"},
+      {R"({"note":"\"faceRects\": {x}","faceRects" : {"s":"}{"}})", R"({"s":"}{"})"},
+      {R"({"faceRects":3,"inner":{"faceRects":{}}})", "{}"},
+      {R"({"faceRects":{"open":1)", ""},
+      {R"({"faceParts":{}})", ""},
+  };
+  for (const Case& c : cases) EXPECT_EQ(jsonObjectMember(c.text, "faceRects"), c.expected) << c.text;
+}
+
+// The Kalman tracker through FaceDetector sees the frames as the C API's
+// tracking mode does, so both report the same faces; the particle trackers run
+// on the same path.
+TEST(TrackerOption, KalmanThroughTheDetectorClassMatchesTheTrackingMode) {
+  const std::string photo = devdata::photo("tracking_faces.jpg");
+  if (!devdata::exists(photo)) GTEST_SKIP() << devdata::missingNote();
+  const Image gray = toGray(loadImage(photo));
+  std::vector<std::uint8_t> frames;
+  for (int k = 0; k < 3; ++k) frames.insert(frames.end(), gray.pixels.begin(), gray.pixels.end());
+  const std::string size = std::to_string(gray.width) + "x" + std::to_string(gray.height);
+
+  CliRun api = runCli({"--raw", size}, frames);
+  SKIP_IF_ENGINE_CANNOT_START(api);
+  ASSERT_EQ(api.status, 0) << api.err;
+  CliRun kf = runCli({"--raw", size, "--tracker", "kf"}, frames);
+  ASSERT_EQ(kf.status, 0) << kf.err;
+  const auto expected = rectsPerLine(api.out), got = rectsPerLine(kf.out);
+  ASSERT_EQ(got.size(), 3u);
+  ASSERT_EQ(expected.size(), 3u);
+  ASSERT_GE(expected[0].size(), 1u) << "the tracking mode finds a face in the development photo";
+  for (std::size_t k = 0; k < 3; ++k) {
+    auto a = expected[k], b = got[k];
+    ASSERT_EQ(a.size(), b.size()) << "frame " << k;
+    std::sort(a.begin(), a.end());
+    std::sort(b.begin(), b.end());
+    // Both scale back from the 320 work frame, each with its own rounding.
+    for (std::size_t i = 0; i < a.size(); ++i)
+      for (std::size_t e = 0; e < 4; ++e) EXPECT_NEAR(a[i][e], b[i][e], 2) << "frame " << k << " face " << i;
+  }
+  for (const char* name : {"simple", "pf", "cpf"}) {
+    CliRun r = runCli({"--raw", size, "--tracker", name}, frames);
+    EXPECT_EQ(r.status, 0) << name << ": " << r.err;
+    EXPECT_EQ(rectsPerLine(r.out).size(), 3u) << name;
+    EXPECT_GE(rectsPerLine(r.out)[0].size(), 1u) << name << ": a new face is found by the whole-frame search";
+  }
 }
 
 // ---------------------------------------------------------------------------

@@ -93,12 +93,14 @@ inline std::unique_ptr<CascadeDetector> builtInCascade()
         R"({"model":"mdcb","imageMaxSize":320,"faceMinSize":24,"faceMaxSize":240})");
 }
 
-// The true box of frame t on a Lissajous path of up to about 6 pixels a frame.
-inline DetectionWindow truthAt(int t, int side)
+// The true box of frame t on a Lissajous path. At a slowness of 1 the face
+// moves up to about 6 pixels a frame; a slowness of k stretches the path's
+// periods k times.
+inline DetectionWindow truthAt(int t, int side, double slowness = 1.0)
 {
     const double pi = 3.14159265358979;
-    const int cx = int(160 + 90 * std::sin(2 * pi * t / 100.0));
-    const int cy = int(120 + 50 * std::sin(2 * pi * t / 70.0));
+    const int cx = int(160 + 90 * std::sin(2 * pi * t / (100.0 * slowness)));
+    const int cy = int(120 + 50 * std::sin(2 * pi * t / (70.0 * slowness)));
     return makeWindow(cx - side / 2, cy - side / 2, cx - side / 2 + side, cy - side / 2 + side);
 }
 

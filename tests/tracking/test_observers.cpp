@@ -11,6 +11,7 @@
 #include "core/Errors.h"
 #include "support/FaceSequence.h"
 #include "support/TrackSupport.h"
+#include "tracking/CPFTracker.h"
 #include "tracking/CascadePF.h"
 #include "tracking/LDAClassifier.h"
 #include "tracking/Observer.h"
@@ -253,4 +254,46 @@ TEST(CascadeFilter, SeedsKeepOnlyShiftsInsideTheImage)
     EXPECT_THROW(outside.update(scene.image, makeWindow(400, 300, 464, 364)), qv_operation_error);
     EXPECT_EQ(outside.initialized, 0u);
     EXPECT_EQ(outside.predict(scene.image, nullptr), 0);
+}
+
+TEST(CPFTrackerUpdate, MatchesAnyOverlapWithTheLastPredictionAndOpensTheRest)
+{
+    FaceScene scene;
+    if (!scene.ready()) GTEST_SKIP() << devdata::missingNote();
+    particle_random::fixSeed(7);
+    CPFTracker t;
+    t.setDetector(*scene.cascade);
+    // No predict yet: every detection opens a face.
+    t.update(scene.image, {scene.truth, makeWindow(20, 150, 84, 214)});
+    ASSERT_EQ(t.cascades.size(), 2u);
+    std::vector<DetectionWindow> predicted;
+    t.predict(scene.image, &predicted);
+    ASSERT_EQ(predicted.size(), 2u);
+    ASSERT_EQ(t.lastPredicted.size(), 2u);
+
+    // A sliver of overlap keeps face 0; of two detections on face 1's window
+    // the larger overlap takes it and the other opens face 2.
+    const DetectionWindow p0 = t.lastPredicted[0], p1 = t.lastPredicted[1];
+    const DetectionWindow sliver = makeWindow(p0.right - 1, p0.bottom - 1, p0.right + 63, p0.bottom + 63);
+    ASSERT_GT(sliver.Overlap(p0), 0.0f);
+    ASSERT_LT(sliver.Overlap(p0), 0.3f);
+    const DetectionWindow close = makeWindow(p1.left + 1, p1.top, p1.right + 1, p1.bottom);
+    const DetectionWindow farther = makeWindow(p1.left + 20, p1.top, p1.right + 20, p1.bottom);
+    t.update(scene.image, {farther, sliver, close});
+    ASSERT_EQ(t.cascades.size(), 3u);
+    EXPECT_TRUE(t.cascades.alive[0] && t.cascades.alive[1] && t.cascades.alive[2]);
+    EXPECT_EQ(t.frameCounter, 2u);
+
+    // Faces live in the tracker's own list: the front end gets no previous
+    // faces from it.
+    std::vector<DetectionWindow> previous;
+    t.getPreviousFaces(&previous);
+    EXPECT_TRUE(previous.empty());
+
+    // No detection: every face dies, and the slots come back on the next face.
+    t.update(scene.image, {});
+    EXPECT_FALSE(t.cascades.alive[0] || t.cascades.alive[1] || t.cascades.alive[2]);
+    t.update(scene.image, {scene.truth});
+    EXPECT_EQ(t.cascades.size(), 3u);
+    particle_random::clearFixedSeed();
 }

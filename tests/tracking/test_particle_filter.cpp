@@ -204,6 +204,11 @@ TEST(PFTrackerUpdate, MatchesOnTheMeanAndDropsUnconfirmedFaces)
     EXPECT_EQ(t.pfFaces.items[1].velocityX, 3);
     EXPECT_TRUE(t.pfFaces.alive[2]);
     EXPECT_EQ(t.frameCounter, 2u);
+    // The faces live in the tracker's own list: the front end gets no previous
+    // faces to follow and finds this tracker's faces by its search cells alone.
+    std::vector<DetectionWindow> previous;
+    t.getPreviousFaces(&previous);
+    EXPECT_TRUE(previous.empty());
     // Dead slots stack again every frame, but the stack stays bounded.
     for (int i = 0; i < 3000; ++i) t.update(image, {});
     EXPECT_LE(t.pfFaces.freeSlots.size(), 1024u);

@@ -66,48 +66,67 @@ std::vector<DetectionWindow> detectionsAt(int t, const DetectionWindow& truth)
     return {makeWindow(truth.left + jx, truth.top + jy, truth.right + jx, truth.bottom + jy)};
 }
 
+// Frames out of 160 on which the tracker's window keeps IoU >= 0.5 with the
+// true box.
+int framesHeld(const std::string& name, const facesequence::Gray& face, CascadeDetector& cascade, double slowness)
+{
+    constexpr int kFrames = 160;
+    FixedSeed seed(1234);
+    std::unique_ptr<Tracker> tracker = makeTracker(name, cascade);
+    int held = 0;
+    IN_IMAGE image;
+    for (int t = 0; t < kFrames; ++t) {
+        const DetectionWindow truth = facesequence::truthAt(t, kSide, slowness);
+        const std::vector<uint8_t> px = facesequence::frameWithFace(face, kWidth, kHeight, truth.left, truth.top);
+        EXPECT_TRUE(image.Init(kWidth, kHeight, kWidth, px.data()));
+        // The tracker's window for this frame is its prediction, made before
+        // it sees this frame's detections.
+        std::vector<DetectionWindow> predicted;
+        tracker->predict(image, &predicted);
+        float best = 0.0f;
+        for (const DetectionWindow& w : predicted) best = std::max(best, w.Overlap(truth));
+        held += best >= 0.5f ? 1 : 0;
+        tracker->update(image, detectionsAt(t, truth));
+    }
+    return held;
+}
+
 } // namespace
 
+// A missed detection ends a track, and the frame after it has none: 10 of the
+// 160 frames go that way, so 150 is the most any tracker can hold.
+//
+// The cascade filter follows by appearance alone: a detection retrains its
+// observers but never moves its cloud, and the cloud has no velocity. Its
+// window is a weighted mean over a cloud twelve pixels wide whose weights
+// differ by a factor of e at most (the boosted discriminants agree, so the
+// vote is +-1), and the 5-feature discriminant is flat (its first feature is
+// the window's inverse deviation, a thousand times smaller than the Haar
+// values, so its logistic stays near 0.5). Such a mean trails a face by part
+// of each step: it holds up to about 1.5 pixels a frame, and past that the
+// cloud falls behind until no sample is positive any more. On the fast path
+// it is held to what it reaches there (63 frames with this seed); below that
+// floor is a regression (a poisoned cloud stops at 0).
 TEST(TrackingSequence, EveryTrackerHoldsAMovingRealFace)
 {
     const facesequence::Gray face = facesequence::faceCrop(kSide);
     if (face.pixels.empty()) GTEST_SKIP() << devdata::missingNote();
     auto cascade = facesequence::builtInCascade();
-    constexpr int kFrames = 160;
 
-    for (const char* name : {"SIMPLE_TRACKER", "KF_TRACKER", "PF_TRACKER", "CPF_TRACKER"}) {
-        FixedSeed seed(1234);
-        std::unique_ptr<Tracker> tracker = makeTracker(name, *cascade);
-        int held = 0;
-        IN_IMAGE image;
-        for (int t = 0; t < kFrames; ++t) {
-            const DetectionWindow truth = facesequence::truthAt(t, kSide);
-            const std::vector<uint8_t> px =
-                facesequence::frameWithFace(face, kWidth, kHeight, truth.left, truth.top);
-            ASSERT_TRUE(image.Init(kWidth, kHeight, kWidth, px.data()));
-            // The tracker's window for this frame is its prediction, made
-            // before it sees this frame's detections.
-            std::vector<DetectionWindow> predicted;
-            tracker->predict(image, &predicted);
-            float best = 0.0f;
-            for (const DetectionWindow& w : predicted) best = std::max(best, w.Overlap(truth));
-            held += best >= 0.5f ? 1 : 0;
-            tracker->update(image, detectionsAt(t, truth));
-        }
-        // A missed detection ends a track, and the frame after it has none:
-        // 10 of the 160 frames go that way.
-        //
-        // The cascade filter falls short and is held to what it reaches
-        // (63 frames with this seed): a detection only retrains it, the cloud
-        // has no velocity, the 5-feature discriminant's likelihood is nearly
-        // flat (its direction follows the feature of least variance, and the
-        // logistic of scores near 0 is 0.5), and the boosted stage weighs
-        // 0.73 against 0.27. Such a cloud trails a face that moves 5 pixels a
-        // frame. Falling below this floor means a real regression (a poisoned
-        // cloud stops at 0).
-        const int required = std::string(name) == "CPF_TRACKER" ? kFrames * 3 / 10 : kFrames * 9 / 10;
-        EXPECT_GE(held, required) << name;
-        RecordProperty(std::string(name) + "_held", held);
+    struct Case {
+        const char* tracker;
+        double slowness; // 1: up to ~6 px a frame; 5: up to ~1.1 px a frame
+        int required;    // of 160
+    };
+    const Case cases[] = {
+        {"SIMPLE_TRACKER", 1.0, 144}, {"KF_TRACKER", 1.0, 144}, {"PF_TRACKER", 1.0, 144},
+        {"CPF_TRACKER", 1.0, 60},     {"SIMPLE_TRACKER", 5.0, 144}, {"KF_TRACKER", 5.0, 144},
+        {"PF_TRACKER", 5.0, 144},     {"CPF_TRACKER", 5.0, 144},
+    };
+    for (const Case& c : cases) {
+        const int held = framesHeld(c.tracker, face, *cascade, c.slowness);
+        EXPECT_GE(held, c.required) << c.tracker << " at slowness " << c.slowness;
+        RecordProperty(std::string(c.tracker) + "_held_" + std::to_string(int(c.slowness)), held);
     }
 }
 
