@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Compares a cascade payload (models/mdcb.bin) with the OpenCV cascade it was made from,
+"""Compares a cascade payload (models/mdcb-converted.bin) with the OpenCV cascade it was made from,
 window by window and after grouping, on photos of the development data cache.
 
 Window test: every 24x24 window of each photo and of its copies downscaled by fixed
@@ -79,7 +79,7 @@ def grouped(casc, classifier, gray, step=0.1):
 def main(argv=None):
     ap = argparse.ArgumentParser(description=__doc__.splitlines()[0])
     ap.add_argument('--payload', default=os.path.join(os.path.dirname(os.path.abspath(__file__)),
-                                                      '..', 'models', 'mdcb.bin'))
+                                                      '..', 'models', 'mdcb-converted.bin'))
     ap.add_argument('--data', default=default_data_dir(), help='development data cache')
     ap.add_argument('--windows', action='store_true', help='run the window test')
     ap.add_argument('--grouped', action='store_true', help='run the grouped test on all photos')

@@ -1,7 +1,7 @@
 #!/usr/bin/python3
 """Converts OpenCV's stump-based frontal face Haar cascade (an XML file such as Debian
 opencv-data's haarcascade_frontalface_default.xml) into the plain payload of our cascade
-model (models/mdcb.bin): one single-score stage per stump, a score reset between the
+model (models/mdcb-converted.bin): one single-score stage per stump, a score reset between the
 boosted stages, a contrast gate in front and a constant stage at the end.
 
 Construction (each choice keeps the per-window decisions of the source):
@@ -100,11 +100,11 @@ def convert(feats, stages, score_gain=0.5):
 
 def main(argv=None):
     ap = argparse.ArgumentParser(description=__doc__.splitlines()[0],
-                                 epilog='Defaults reproduce models/mdcb.bin.')
+                                 epilog='Defaults reproduce models/mdcb-converted.bin.')
     ap.add_argument('--xml', default=DEFAULT_XML, help='source cascade (default: %(default)s)')
     ap.add_argument('--out', default=os.path.join(os.path.dirname(os.path.abspath(__file__)),
-                                                  '..', 'models', 'mdcb.bin'),
-                    help='payload to write (default: models/mdcb.bin)')
+                                                  '..', 'models', 'mdcb-converted.bin'),
+                    help='payload to write (default: models/mdcb-converted.bin)')
     ap.add_argument('--score-gain', type=float, default=0.5,
                     help='power of two multiplying the last stage, hence the reported score')
     args = ap.parse_args(argv)

@@ -1053,13 +1053,27 @@ const char* kUsage = "usage: train_cascade boxes|train|measure|model [--key valu
 
 } // namespace
 
-// Engine payload of a saved cascade state (for example one whose stages were
-// spliced from two runs).
+// Engine payload of a saved cascade state; --first-stage-from puts the first
+// stage of another state in front of this one's later stages (the shipped
+// cascade's cheap first stage was trained apart from the rest).
 int commandModel(std::map<std::string, std::string> const& a)
 {
     Cascade cascade;
     if (!cascade.load(get(a, "--cascade"))) {
         std::cerr << "cannot read the cascade state " << get(a, "--cascade") << "\n";
+        return 1;
+    }
+    const std::string first = get(a, "--first-stage-from");
+    if (!first.empty()) {
+        Cascade other;
+        if (!other.load(first) || other.stages.empty() || cascade.stages.empty()) {
+            std::cerr << "cannot take the first stage from " << first << "\n";
+            return 1;
+        }
+        cascade.stages[0] = other.stages[0];
+    }
+    if (!get(a, "--save").empty() && !cascade.save(get(a, "--save"))) {
+        std::cerr << "cannot write " << get(a, "--save") << "\n";
         return 1;
     }
     CascadeWriter::writeFile(get(a, "--out"), cascade.toModel());
