@@ -32,7 +32,9 @@ void SvmClassifier::init(ModelReader& reader)
     m.svCounts = pm::readInt32s(reader, k);
     m.svTotal = pm::readInt32(reader);
     m.featureLength = pm::readInt32(reader);
-    if (m.svTotal < 0 || m.featureLength < 0
+    // The row count is bounded on its own too: with a feature length of 0 the
+    // product says nothing, and each row is still an object to allocate.
+    if (m.svTotal < 0 || m.featureLength < 0 || m.svTotal > MAX_SUPPORT_VECTORS
         || static_cast<long long>(m.svTotal) * m.featureLength > MAX_SUPPORT_VALUES)
         throw qv_data_error("SVM model support vector table out of range");
     const int32_t nonZeroCount = pm::readInt32(reader);
