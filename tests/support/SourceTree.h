@@ -6,6 +6,8 @@
 #include <fstream>
 #include <iterator>
 #include <string>
+
+#include <unistd.h>
 #include <vector>
 
 // Paths into the source tree and small file helpers for tests that check
@@ -52,7 +54,9 @@ inline void writeText(const std::string& file, const std::string& text) {
 
 // A fresh scratch directory under the build tree (or /tmp when it can't be made).
 inline std::string scratchDir(const std::string& name) {
-    const std::string dir = binaryRoot() + "/test-scratch/" + name;
+    // One directory per process: ctest runs the cases of one program in
+    // parallel processes, and each clears its directory first.
+    const std::string dir = binaryRoot() + "/test-scratch/" + name + "-" + std::to_string(::getpid());
     const std::string command = "rm -rf '" + dir + "' && mkdir -p '" + dir + "'";
     if (std::system(command.c_str()) != 0) return "/tmp";
     return dir;
