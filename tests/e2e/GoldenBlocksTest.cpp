@@ -14,6 +14,7 @@
 
 #include <gtest/gtest.h>
 
+#include "support/GoldenFile.h"
 #include "ImageIo.h"
 #include "quorin/quorinapi.h"
 #include "support/DevData.h"
@@ -70,21 +71,5 @@ TEST(GoldenBlocks, DevelopmentPhotosGiveTheRecordedBlocks) {
     for (const char* name : kPhotos)
         if (!devdata::exists(devdata::photo(name))) GTEST_SKIP() << devdata::missingNote();
     const std::vector<std::string> lines = currentLines();
-    if (std::getenv("QUORIN_WRITE_GOLDEN")) {
-        std::ofstream out(goldenPath());
-        out << "# quorin_detect blocks of the development photos, written on x86-64; see GoldenBlocksTest.cpp\n";
-        for (const std::string& l : lines) out << l << "\n";
-        GTEST_SKIP() << "golden file rewritten: " << goldenPath();
-    }
-    std::ifstream in(goldenPath());
-    ASSERT_TRUE(in) << "no golden file at " << goldenPath();
-    std::vector<std::string> golden;
-    for (std::string l; std::getline(in, l);)
-        if (!l.empty() && l[0] != '#') golden.push_back(l);
-    ASSERT_EQ(golden.size(), lines.size());
-    int differences = 0;
-    for (size_t i = 0; i < lines.size(); ++i)
-        if (lines[i] != golden[i] && ++differences <= 5)
-            ADD_FAILURE() << "line " << i << "\n  golden: " << golden[i] << "\n  now:    " << lines[i];
-    EXPECT_EQ(differences, 0);
+    expectGoldenLines(goldenPath(), "quorin_detect blocks of the development photos, written on x86-64; see GoldenBlocksTest.cpp", lines);
 }

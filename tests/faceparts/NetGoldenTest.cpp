@@ -14,6 +14,7 @@
 
 #include <gtest/gtest.h>
 
+#include "support/GoldenFile.h"
 #include "faceparts/NeuralClassifier.h"
 #include "faceparts/NeuralNet.h"
 #include "support/SourceTree.h"
@@ -66,17 +67,5 @@ TEST(NetGolden, BuiltInNetGivesTheRecordedIntegers) {
         for (uint32_t i = 0; i < outputs; ++i) line << " " << out[i];
         lines.push_back(line.str());
     }
-    if (std::getenv("QUORIN_WRITE_GOLDEN")) {
-        std::ofstream out(goldenPath());
-        out << "# landmark net outputs for generated patches, written on x86-64; see NetGoldenTest.cpp\n";
-        for (const std::string& l : lines) out << l << "\n";
-        GTEST_SKIP() << "golden file rewritten: " << goldenPath();
-    }
-    std::ifstream in(goldenPath());
-    ASSERT_TRUE(in) << "no golden file at " << goldenPath();
-    std::vector<std::string> golden;
-    for (std::string l; std::getline(in, l);)
-        if (!l.empty() && l[0] != '#') golden.push_back(l);
-    ASSERT_EQ(golden.size(), lines.size());
-    for (size_t i = 0; i < lines.size(); ++i) EXPECT_EQ(lines[i], golden[i]) << "patch " << i;
+    expectGoldenLines(goldenPath(), "landmark net outputs for generated patches, written on x86-64; see NetGoldenTest.cpp", lines);
 }
