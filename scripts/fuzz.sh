@@ -7,6 +7,8 @@
 #   FUZZ_SECONDS=300 bash scripts/fuzz.sh     a campaign of 5 min per target
 #   FUZZ_TARGETS="json net_blob" bash scripts/fuzz.sh
 #   FUZZ_JOBS=2 bash scripts/fuzz.sh          two targets at a time
+#   FUZZ_SEED=1 bash scripts/fuzz.sh          a fixed random seed (CI), so that
+#                                             a run's result follows the commit
 # Crashing inputs land in build-fuzz/findings/<target>/; copy each into
 # tests/fuzz/regressions/<target>/ once fixed, where the fuzz regression test
 # replays it on every run of the suite. Skips (exit 0) without clang/libFuzzer.
@@ -14,6 +16,8 @@ set -euo pipefail
 ROOT="$(cd "$(dirname "$0")/.." && pwd)"
 SECONDS_PER_TARGET="${FUZZ_SECONDS:-30}"
 JOBS="${FUZZ_JOBS:-1}"
+SEED_ARG=()
+[ -n "${FUZZ_SEED:-}" ] && SEED_ARG=(-seed="$FUZZ_SEED")
 CXX_BIN="$(command -v clang++-14 || command -v clang++ || true)"
 C_BIN="$(command -v clang-14 || command -v clang || true)"
 if [ -z "$CXX_BIN" ] || [ -z "$C_BIN" ]; then
@@ -59,7 +63,7 @@ run_one() {
   local rc=0
   (cd "$BUILD" && "$BUILD/tests/fuzz/fuzz_$target" -max_total_time="$SECONDS_PER_TARGET" \
      -rss_limit_mb=2048 -malloc_limit_mb=1024 -timeout=25 -max_len="$(max_len "$target")" \
-     -artifact_prefix="$findings/" -print_final_stats=1 "$corpus" "$seeds") >"$log" 2>&1 || rc=$?
+     -artifact_prefix="$findings/" -print_final_stats=1 "${SEED_ARG[@]}" "$corpus" "$seeds") >"$log" 2>&1 || rc=$?
   local runs speed
   runs="$(grep -E "stat::number_of_executed_units" "$log" | tail -1 | awk '{print $2}')"
   speed="$(grep -E "stat::average_exec_per_sec" "$log" | tail -1 | awk '{print $2}')"

@@ -37,8 +37,20 @@ void SvmClassifier::init(ModelReader& reader)
     if (m.svTotal < 0 || m.featureLength < 0 || m.svTotal > MAX_SUPPORT_VECTORS
         || static_cast<long long>(m.svTotal) * m.featureLength > MAX_SUPPORT_VALUES)
         throw qv_data_error("SVM model support vector table out of range");
+    long long listed = 0;
+    for (int32_t n : m.svCounts) {
+        if (n < 0)
+            throw qv_data_error("SVM model support vector count out of range");
+        listed += n;
+    }
+    if (listed != m.svTotal)
+        throw qv_data_error("SVM model support vector counts do not add up");
     const int32_t nonZeroCount = pm::readInt32(reader);
-    pm::requireBytes(reader, nonZeroCount, 8);
+    // The entries and the coefficient rows that follow must both be there
+    // before the dense table is made.
+    if (nonZeroCount < 0)
+        throw qv_data_error("SVM model support vector entry count out of range");
+    pm::requireBytes(reader, 2LL * nonZeroCount + (k - 1) * m.svTotal, 4);
     m.supportVectors.assign(m.svTotal, std::vector<float>(m.featureLength, 0.0f));
     for (int32_t e = 0; e < nonZeroCount; ++e) {
         std::vector<int16_t> at = pm::readInt16s(reader, 2);

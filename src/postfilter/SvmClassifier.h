@@ -29,7 +29,9 @@ public:
     // Largest dense support vector table a model may ask for, in values; the
     // file stores it sparse, so its size alone does not bound the expansion.
     static constexpr long long MAX_SUPPORT_VALUES = 16LL * 1024 * 1024;
-    static constexpr long long MAX_SUPPORT_VECTORS = 1LL << 20;
+    // Each support vector costs a dot product per judged hit: far beyond this
+    // count a post filter could never keep up with a frame.
+    static constexpr long long MAX_SUPPORT_VECTORS = 1LL << 16;
 
     SvmClassifier() = default;
     explicit SvmClassifier(ModelReader& reader);
