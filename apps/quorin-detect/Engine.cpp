@@ -10,20 +10,6 @@
 namespace qcli {
 namespace {
 
-// Runs an engine call, turning whatever it throws into EngineError.
-template <typename F>
-auto guarded(const char* what, F&& call) -> decltype(call()) {
-  try {
-    return call();
-  } catch (const std::exception& e) {
-    throw EngineError(std::string(what) + ": " + e.what());
-  } catch (const char* text) {
-    throw EngineError(std::string(what) + ": " + (text ? text : "(no message)"));
-  } catch (...) {
-    throw EngineError(std::string(what) + ": unknown failure");
-  }
-}
-
 // Long-side targets of the detection modes.
 constexpr int kModeTarget[3] = {240, 320, 640};
 

@@ -2,6 +2,7 @@
 #define QUORIN_APPS_ENGINE_H
 
 #include <cstdint>
+#include <exception>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -14,6 +15,20 @@ namespace qcli {
 struct EngineError : std::runtime_error {
   using std::runtime_error::runtime_error;
 };
+
+// Runs an engine call, turning whatever it throws into EngineError.
+template <typename F>
+auto guarded(const char* what, F&& call) -> decltype(call()) {
+  try {
+    return call();
+  } catch (const std::exception& e) {
+    throw EngineError(std::string(what) + ": " + e.what());
+  } catch (const char* text) {
+    throw EngineError(std::string(what) + ": " + (text ? text : "(no message)"));
+  } catch (...) {
+    throw EngineError(std::string(what) + ": unknown failure");
+  }
+}
 
 // The detect entry point the options select.
 enum class Entry {

@@ -37,19 +37,6 @@ std::size_t skipObject(const std::string& text, std::size_t i) {
   return std::string::npos;
 }
 
-template <typename F>
-auto guarded(const char* what, F&& call) -> decltype(call()) {
-  try {
-    return call();
-  } catch (const std::exception& e) {
-    throw EngineError(std::string(what) + ": " + e.what());
-  } catch (const char* text) {
-    throw EngineError(std::string(what) + ": " + (text ? text : "(no message)"));
-  } catch (...) {
-    throw EngineError(std::string(what) + ": unknown failure");
-  }
-}
-
 }  // namespace
 
 std::string jsonObjectMember(const std::string& text, const std::string& key) {
