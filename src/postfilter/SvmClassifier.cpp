@@ -32,9 +32,11 @@ void SvmClassifier::init(ModelReader& reader)
     m.svCounts = pm::readInt32s(reader, k);
     m.svTotal = pm::readInt32(reader);
     m.featureLength = pm::readInt32(reader);
-    // The row count is bounded on its own too: with a feature length of 0 the
-    // product says nothing, and each row is still an object to allocate.
+    // Both factors are bounded on their own too: with either of them 0 the
+    // product says nothing, yet each row is an object to allocate and the
+    // first row is made at full length.
     if (m.svTotal < 0 || m.featureLength < 0 || m.svTotal > MAX_SUPPORT_VECTORS
+        || m.featureLength > MAX_SUPPORT_VALUES
         || static_cast<long long>(m.svTotal) * m.featureLength > MAX_SUPPORT_VALUES)
         throw qv_data_error("SVM model support vector table out of range");
     long long listed = 0;
