@@ -14,7 +14,7 @@ namespace {
 // A feature of `kind`; for HAAR, `count` random rectangles inside a
 // size x size window with random weights (fractions included, so that the
 // accumulation order shows in the last bit).
-WindowFeature randomFeature(int kind, int count, int size, std::mt19937& rng)
+WindowFeature randomFeature(int kind, int count, int size, int stride, std::mt19937& rng)
 {
     WindowFeature f;
     f.kind = kind;
@@ -32,6 +32,7 @@ WindowFeature randomFeature(int kind, int count, int size, std::mt19937& rng)
         r.bottom = r.top + 1 + static_cast<int>(rng() % (size - r.top - 1));
         r.weight = weight(rng) / 7.0f;
     }
+    f.prepareOffsets(stride);
     return f;
 }
 
@@ -60,16 +61,11 @@ TEST(ScaleFeatures, WalkGivesTheFeaturesOwnValuesBitForBit)
 
         // The chain as common stages, and again split into two branches.
         std::vector<WindowFeature> common;
-        for (const Case& c : chain)
-            common.push_back(randomFeature(c.kind, c.count, 36, rng));
         std::vector<std::vector<WindowFeature>> branches(2);
         for (const Case& c : chain)
-            branches[branches[0].size() < 4 ? 0 : 1].push_back(randomFeature(c.kind, c.count, 36, rng));
-        for (WindowFeature& f : common)
-            f.prepareOffsets(image.stride);
-        for (auto& branch : branches)
-            for (WindowFeature& f : branch)
-                f.prepareOffsets(image.stride);
+            common.push_back(randomFeature(c.kind, c.count, 36, image.stride, rng));
+        for (const Case& c : chain)
+            branches[branches[0].size() < 4 ? 0 : 1].push_back(randomFeature(c.kind, c.count, 36, image.stride, rng));
 
         ScaleFeatures laidOut;
         ASSERT_TRUE(laidOut.build(common, branches, image.stride));

@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <array>
 #include <random>
 #include <vector>
 
@@ -13,24 +15,16 @@
 
 namespace {
 
-CascadeStage stageWithThresholds(float t0, float t1, float t2, float t3, float t4, float t5, float t6)
+// A stage whose bin scores (of the first score) are the bin numbers.
+CascadeStage binnedStage(std::array<float, 7> thresholds, int scoreCount = 1)
 {
     CascadeStage s;
-    const float t[7] = {t0, t1, t2, t3, t4, t5, t6};
-    for (int i = 0; i < 7; ++i)
-        s.binThresholds[i] = t[i];
-    s.scoreCount = 1;
+    std::copy(thresholds.begin(), thresholds.end(), s.binThresholds);
+    s.scoreCount = scoreCount;
     for (int b = 0; b < 8; ++b)
-        s.binScores[0][b] = static_cast<float>(b); // the score added is the bin
+        s.binScores[0][b] = static_cast<float>(b);
     s.rejectThreshold[0] = -1e30f;
     return s;
-}
-
-int binOf(CascadeStage const& s, float value)
-{
-    float scores[15] = {};
-    s.UpdateScoreAndThreshold(value, scores);
-    return static_cast<int>(scores[0]);
 }
 
 struct RandomIntegral {
@@ -79,41 +73,28 @@ void loadStage(CascadeModelStage const& written, CascadeStage& stage, WindowFeat
 
 TEST(StageBins, HigherValuesFallInLowerBinsAndTiesGoUp)
 {
-    const CascadeStage s = stageWithThresholds(60, 50, 40, 30, 20, 10, 0);
-    EXPECT_EQ(binOf(s, 100), 0);
-    EXPECT_EQ(binOf(s, 60), 0);
-    EXPECT_EQ(binOf(s, 59.9f), 1);
-    EXPECT_EQ(binOf(s, 50), 1);
-    EXPECT_EQ(binOf(s, 45), 2);
-    EXPECT_EQ(binOf(s, 35), 3);
-    EXPECT_EQ(binOf(s, 30), 3);
-    EXPECT_EQ(binOf(s, 29.9f), 4);
-    EXPECT_EQ(binOf(s, 10), 5);
-    EXPECT_EQ(binOf(s, 5), 6);
-    EXPECT_EQ(binOf(s, 0), 6);
-    EXPECT_EQ(binOf(s, -1), 7);
+    const CascadeStage s = binnedStage({60, 50, 40, 30, 20, 10, 0});
+    const std::pair<float, int> cases[] = {{100, 0}, {60, 0},   {59.9f, 1}, {50, 1}, {45, 2}, {30, 3},
+                                           {29.9f, 4}, {10, 5}, {0, 6},     {-1, 7}};
+    for (auto const& [value, bin] : cases) {
+        float score[15] = {};
+        s.UpdateScoreAndThreshold(value, score);
+        EXPECT_EQ(score[0], bin) << value;
+    }
 }
 
-TEST(StageScores, SingleScoreIgnoresTheSentinelAndSurvivesAtItsThreshold)
+TEST(StageScores, ScoresAtTheirThresholdSurviveAndRejectionNeedsAllDead)
 {
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
-    for (int b = 0; b < 8; ++b)
-        s.binScores[0][b] = 2.0f;
-    s.rejectThreshold[0] = -18.0f;
-    float scores[15] = {-20.0f};
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(1.0f, scores)); // -20 + 2 = -18: equal survives
-    EXPECT_EQ(scores[0], -18.0f);
-    s.rejectThreshold[0] = -15.0f;
-    EXPECT_TRUE(s.UpdateScoreAndThreshold(1.0f, scores));
-}
+    CascadeStage one = binnedStage({2, 1, 0, 0, 0, 0, 0});
+    one.rejectThreshold[0] = -18.0f;
+    float single[15] = {-20.0f};
+    EXPECT_FALSE(one.UpdateScoreAndThreshold(0.0f, single)); // bin 2: the dead mark is a plain score, -18 survives
+    one.rejectThreshold[0] = -15.0f;
+    EXPECT_TRUE(one.UpdateScoreAndThreshold(0.0f, single));
 
-TEST(StageScores, DeadScoresStayDeadAndRejectionNeedsAllDead)
-{
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
-    s.scoreCount = 3;
+    CascadeStage s = binnedStage({0, 0, 0, 0, 0, 0, 0}, 3);
     for (int i = 0; i < 3; ++i)
-        for (int b = 0; b < 8; ++b)
-            s.binScores[i][b] = 1.0f;
+        s.binScores[i][0] = 1.0f;
     s.rejectThreshold[0] = 0.5f;
     s.rejectThreshold[1] = 5.0f; // will die
     s.rejectThreshold[2] = 1.0f; // equal survives
@@ -121,43 +102,15 @@ TEST(StageScores, DeadScoresStayDeadAndRejectionNeedsAllDead)
     EXPECT_FALSE(s.UpdateScoreAndThreshold(0.0f, scores));
     EXPECT_EQ(scores[0], 1.0f);
     EXPECT_EQ(scores[1], -20.0f);
-    EXPECT_EQ(scores[2], 1.0f);
-    // A dead score gets no bin score.
     EXPECT_FALSE(s.UpdateScoreAndThreshold(0.0f, scores));
-    EXPECT_EQ(scores[1], -20.0f);
+    EXPECT_EQ(scores[1], -20.0f) << "a dead score gets no bin score";
     s.rejectThreshold[0] = s.rejectThreshold[2] = 100.0f;
     EXPECT_TRUE(s.UpdateScoreAndThreshold(0.0f, scores));
-}
-
-TEST(StageScores, NoScoresRejectsAtOnce)
-{
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
     s.scoreCount = 0;
-    float scores[15] = {};
-    EXPECT_TRUE(s.UpdateScoreAndThreshold(3.0f, scores));
+    EXPECT_TRUE(s.UpdateScoreAndThreshold(0.0f, scores)) << "no scores rejects at once";
 }
 
-TEST(StageScores, RemapBranchesOneScoreIntoSeveral)
-{
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
-    s.scoreCount = 3;
-    s.remapFlag = 1;
-    s.remap[0] = 0;
-    s.remap[1] = 0;
-    s.remap[2] = 2; // a slot never written reads 0
-    for (int i = 0; i < 3; ++i) {
-        for (int b = 0; b < 8; ++b)
-            s.binScores[i][b] = float(i + 1);
-        s.rejectThreshold[i] = -100.0f;
-    }
-    float scores[15] = {4.0f, 9.0f, 0.0f};
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(1.0f, scores));
-    EXPECT_EQ(scores[0], 5.0f);
-    EXPECT_EQ(scores[1], 6.0f);
-    EXPECT_EQ(scores[2], 3.0f);
-}
-
-TEST(StageLoading, RecordRoundTripsThroughTheWriter)
+TEST(StageLoading, RecordRoundTripsThroughTheWriterAndUnknownKindsReadNoFeature)
 {
     CascadeModelStage w = CascadeWriter::stump(
         CascadeWriter::haar({{2.5f, 1, 2, 5, 9}, {-1.0f, 0, 0, 24, 24}}), 0.75f, 1.0f, -1.0f, -3.0f);
@@ -165,162 +118,115 @@ TEST(StageLoading, RecordRoundTripsThroughTheWriter)
     CascadeStage stage;
     WindowFeature feature;
     loadStage(w, stage, feature);
-    EXPECT_EQ(stage.scoreCount, 1);
-    EXPECT_EQ(stage.remapFlag, 0);
-    EXPECT_EQ(stage.binThresholds[0], 7.0f);
-    EXPECT_EQ(stage.binThresholds[6], 1.0f);
-    EXPECT_EQ(stage.binScores[0][3], 1.0f);
-    EXPECT_EQ(stage.binScores[0][4], -1.0f);
-    EXPECT_EQ(stage.rejectThreshold[0], -3.0f);
-    EXPECT_EQ(stage.feature, &feature);
-    ASSERT_EQ(feature.kind, 1);
+    EXPECT_EQ(std::vector<float>({stage.binThresholds[6], stage.binScores[0][3], stage.binScores[0][4]}),
+              std::vector<float>({1, 1, -1}));
     ASSERT_EQ(feature.haar->count, 2);
     // Stored left, top, right, bottom; held left, right, top, bottom.
     const HaarRect& r = feature.haar->rects[0];
-    EXPECT_EQ(r.weight, 2.5f);
-    EXPECT_EQ(r.left, 1);
-    EXPECT_EQ(r.top, 2);
-    EXPECT_EQ(r.right, 5);
-    EXPECT_EQ(r.bottom, 9);
-}
+    EXPECT_EQ(std::vector<float>({r.weight, float(r.left), float(r.top), float(r.right), float(r.bottom)}),
+              std::vector<float>({2.5f, 1, 2, 5, 9}));
 
-TEST(StageLoading, UnknownFeatureKindReadsNoFeatureBytesAndTheStageGoesOn)
-{
-    CascadeModelStage w = CascadeWriter::stump(CascadeWriter::deviation(), 0.5f, 1.0f, -1.0f, -3.0f);
+    // A kind no model should carry reads no feature bytes: the stage goes on.
+    w.feature = CascadeWriter::deviation();
     w.feature.kind = 7;
-    CascadeStage stage;
-    WindowFeature feature;
-    loadStage(w, stage, feature);
-    EXPECT_EQ(feature.kind, 7);
-    EXPECT_EQ(stage.binThresholds[3], 0.5f);
-    EXPECT_EQ(stage.rejectThreshold[0], -3.0f);
+    CascadeStage next;
+    WindowFeature odd;
+    loadStage(w, next, odd);
+    EXPECT_EQ(odd.kind, 7);
+    EXPECT_EQ(next.rejectThreshold[0], -3.0f);
     RandomIntegral img(30, 30, 1);
-    EXPECT_EQ(feature.Eval(img.image, 0.5f, 0), 0.0f);
+    EXPECT_EQ(odd.Eval(img.image, 0.5f, 0), 0.0f);
 }
 
 TEST(StageLoading, RejectsMalformedRecordsWithADataError)
 {
-    auto expectRejected = [](CascadeModelStage const& w, const char* what) {
+    auto scores = [](int count, std::vector<int32_t> remap) {
+        CascadeModelStage s = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
+        s.scoreCount = count;
+        s.binScores.resize(size_t(std::max(count, 0)));
+        s.rejectThresholds.resize(size_t(std::max(count, 0)));
+        s.remapFlag = remap.empty() ? 0 : 1;
+        s.remap = remap;
+        return s;
+    };
+    auto rects = [](std::vector<CascadeModelRect> r) {
+        return CascadeWriter::stump(CascadeWriter::haar(std::move(r)), 0, 0, 0, 0);
+    };
+    const struct {
+        const char* what;
+        CascadeModelStage stage;
+        bool loads;
+    } cases[] = {
+        {"scoreCount 16", scores(16, {}), false},
+        {"scoreCount -1", scores(-1, {}), false},
+        {"remap entry 2 of 2 scores", scores(2, {0, 2}), false},
+        {"remap entry -1", scores(2, {-1, 0}), false},
+        {"15 scores, remap in range", scores(15, std::vector<int32_t>(15, 14)), true},
+        {"right 25", rects({{1, 0, 0, 25, 24}}), false},
+        {"left -1", rects({{1, -1, 0, 4, 4}}), false},
+        {"empty rect", rects({{1, 4, 4, 4, 8}}), false},
+        {"65 rectangles", rects(std::vector<CascadeModelRect>(65, CascadeModelRect{1, 0, 0, 1, 1})), false},
+        {"the whole window", rects({{1, 0, 0, 24, 24}}), true},
+    };
+    for (auto const& c : cases) {
         CascadeStage stage;
         WindowFeature feature;
-        EXPECT_THROW(loadStage(w, stage, feature), qv_data_error) << what;
-    };
-    CascadeModelStage many = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
-    many.scoreCount = 16;
-    expectRejected(many, "scoreCount 16");
-    CascadeModelStage negative = many;
-    negative.scoreCount = -1;
-    expectRejected(negative, "scoreCount -1");
-    CascadeModelStage remap = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
-    remap.scoreCount = 2;
-    remap.binScores.resize(2);
-    remap.rejectThresholds.resize(2);
-    remap.remapFlag = 1;
-    remap.remap = {0, 2};
-    expectRejected(remap, "remap entry 2 of 2 scores");
-    remap.remap = {-1, 0};
-    expectRejected(remap, "remap entry -1");
-    expectRejected(CascadeWriter::stump(CascadeWriter::haar({{1, 0, 0, 25, 24}}), 0, 0, 0, 0), "right 25");
-    expectRejected(CascadeWriter::stump(CascadeWriter::haar({{1, -1, 0, 4, 4}}), 0, 0, 0, 0), "left -1");
-    expectRejected(CascadeWriter::stump(CascadeWriter::haar({{1, 4, 4, 4, 8}}), 0, 0, 0, 0), "empty rect");
-    CascadeModelStage rects = CascadeWriter::stump(CascadeWriter::haar({}), 0, 0, 0, 0);
-    rects.feature.rects.assign(65, CascadeModelRect{1, 0, 0, 1, 1});
-    expectRejected(rects, "65 rectangles");
-
-    // Valid edge: 15 scores with an in-range remap loads.
-    CascadeModelStage full = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
-    full.scoreCount = 15;
-    full.binScores.resize(15);
-    full.rejectThresholds.resize(15);
-    full.remapFlag = 1;
-    full.remap.assign(15, 14);
-    CascadeStage stage;
-    WindowFeature feature;
-    EXPECT_NO_THROW(loadStage(full, stage, feature));
-    EXPECT_EQ(stage.remap[0], 14);
-}
-
-TEST(StageLoading, HeaderCheckOnlyReports)
-{
-    std::vector<uint8_t> bytes;
-    for (int v : {24, 24, 7, 24, 20, 7})
-        CascadeWriter::putInt(bytes, v);
-    ScopedModel model("classifierheader", bytes);
-    ModelReader reader("classifierheader", ModelReader::RAW);
-    EXPECT_TRUE(CascadeStage::checkHeader(reader));
-    EXPECT_FALSE(CascadeStage::checkHeader(reader));
-}
-
-TEST(HaarEvaluation, PreparedOffsetsAgreeWithCoordinatesAndBruteForce)
-{
-    RandomIntegral img(40, 30, 2);
-    for (int n : {1, 2, 3, 4}) {
-        std::vector<HaarRect> rects;
-        for (int i = 0; i < n; ++i)
-            rects.push_back(rect(0.5f * (i + 1) * (i % 2 ? -1 : 1), i, 2 * i, 10 + i, 12 + i));
-        HaarFeature f = makeFeature(rects);
-        f.prepareOffsets(img.image.stride);
-        const int x = 7, y = 5;
-        float expected = 0.0f;
-        for (auto const& r : rects) {
-            unsigned sum = 0;
-            for (int yy = y + r.top; yy < y + r.bottom; ++yy)
-                for (int xx = x + r.left; xx < x + r.right; ++xx)
-                    sum += img.px[size_t(yy) * 40 + xx];
-            expected += float(sum) * r.weight;
-        }
-        expected *= 0.125f;
-        EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, y * img.image.stride + x), expected) << n;
-        EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, x, y), expected) << n;
+        if (c.loads)
+            EXPECT_NO_THROW(loadStage(c.stage, stage, feature)) << c.what;
+        else
+            EXPECT_THROW(loadStage(c.stage, stage, feature), qv_data_error) << c.what;
     }
 }
 
-TEST(HaarEvaluation, OffsetsFollowTheStride)
+TEST(HaarEvaluation, PreparedOffsetsAgreeWithCoordinatesAndBruteForceAtAnyStride)
 {
-    RandomIntegral narrow(30, 30, 3), wide(50, 30, 3);
-    HaarFeature f = makeFeature({rect(1.0f, 2, 3, 8, 9), rect(-1.0f, 0, 0, 4, 4)});
-    f.prepareOffsets(wide.image.stride);
-    EXPECT_FLOAT_EQ(f.Eval(wide.image, 1.0f, 4 * wide.image.stride + 6), f.Eval(wide.image, 1.0f, 6, 4));
-    f.prepareOffsets(narrow.image.stride);
-    EXPECT_FLOAT_EQ(f.Eval(narrow.image, 1.0f, 4 * narrow.image.stride + 6), f.Eval(narrow.image, 1.0f, 6, 4));
+    for (int width : {40, 53}) {
+        RandomIntegral img(width, 30, 2);
+        for (int n : {1, 2, 3, 4}) {
+            std::vector<HaarRect> rects;
+            for (int i = 0; i < n; ++i)
+                rects.push_back(rect(0.5f * (i + 1) * (i % 2 ? -1 : 1), i, 2 * i, 10 + i, 12 + i));
+            HaarFeature f = makeFeature(rects);
+            f.prepareOffsets(img.image.stride);
+            const int x = 7, y = 5;
+            float expected = 0.0f;
+            for (auto const& r : rects) {
+                unsigned sum = 0;
+                for (int yy = y + r.top; yy < y + r.bottom; ++yy)
+                    for (int xx = x + r.left; xx < x + r.right; ++xx)
+                        sum += img.px[size_t(yy) * width + xx];
+                expected += float(sum) * r.weight;
+            }
+            expected *= 0.125f;
+            EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, y * img.image.stride + x), expected) << width << " " << n;
+            EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, x, y), expected) << width << " " << n;
+        }
+    }
 }
 
-TEST(HaarScaling, UnitScaleCopiesAndRoundedAreasCorrectTheWeight)
+TEST(HaarScaling, RoundedAreasCorrectTheWeightAndOnlyKnownKindsCopy)
 {
     HaarFeature base = makeFeature({rect(2.0f, 1, 1, 4, 4), rect(-1.0f, 0, 0, 24, 24)});
     HaarFeature same(&base, 1.0f);
-    ASSERT_EQ(same.count, 2);
-    EXPECT_EQ(same.rects[0].left, 1);
     EXPECT_EQ(same.rects[0].right, 4);
     EXPECT_EQ(same.rects[0].weight, 2.0f);
-
     HaarFeature scaled(&base, 1.25f);
     // 1 -> 1.75 -> 1 (trunc of 1.75), 4 -> 5.5 -> 5: 4 x 4 pixels for 3 x 3.
-    EXPECT_EQ(scaled.rects[0].left, 1);
-    EXPECT_EQ(scaled.rects[0].right, 5);
-    EXPECT_EQ(scaled.rects[0].top, 1);
-    EXPECT_EQ(scaled.rects[0].bottom, 5);
+    EXPECT_EQ(std::vector<int>({scaled.rects[0].left, scaled.rects[0].top, scaled.rects[0].right,
+                                scaled.rects[0].bottom}),
+              std::vector<int>({1, 1, 5, 5}));
     EXPECT_FLOAT_EQ(scaled.rects[0].weight, 2.0f * 9.0f / 16.0f);
     EXPECT_EQ(scaled.rects[1].right, 30);
     EXPECT_FLOAT_EQ(scaled.rects[1].weight, -576.0f / 900.0f);
-
     HaarFeature none;
     EXPECT_FALSE(none.Init(nullptr, 2.0f));
-}
 
-TEST(HaarScaling, DeviationFeatureStaysItselfAndUnknownKindsDoNotCopy)
-{
-    WindowFeature dev;
+    WindowFeature dev, copy, odd, empty;
     dev.kind = WindowFeature::DEVIATION;
-    WindowFeature copy;
     EXPECT_TRUE(copy.Init(&dev, 3.7f));
-    EXPECT_EQ(copy.kind, WindowFeature::DEVIATION);
     RandomIntegral img(30, 30, 4);
-    EXPECT_EQ(copy.Eval(img.image, 0.25f, 0), 0.25f);
-
-    WindowFeature odd;
+    EXPECT_EQ(copy.Eval(img.image, 0.25f, 0), 0.25f) << "the deviation feature stays itself";
     odd.kind = 5;
     EXPECT_FALSE(copy.Init(&odd, 1.0f));
-    WindowFeature empty;
     EXPECT_EQ(empty.Eval(img.image, 0.25f, 0), 0.0f);
 }

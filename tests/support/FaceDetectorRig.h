@@ -32,18 +32,6 @@ inline CascadeModel contrastScoredCascade()
 
 constexpr unsigned char kHalfBright = 120;
 
-// Accepts a window whose left and top edges meet a bright block's corner,
-// whatever the block's size: the same corner is a hit at many window sizes.
-inline CascadeModel cornerCascade()
-{
-    CascadeModel model;
-    for (int i = 0; i < 10; ++i) model.common.push_back(passStage());
-    model.common.push_back(CascadeWriter::stump(squareEdge(0), 1.0f, 0.0f, -1.0f, -0.5f));
-    model.common.push_back(CascadeWriter::stump(squareEdge(2), 1.0f, 0.0f, -1.0f, -0.5f));
-    model.common.push_back(CascadeWriter::stump(CascadeWriter::deviation(), -1.0f, 1.0f, 1.0f, -1e30f));
-    return singleBranch(model);
-}
-
 struct FaceDetectorModels {
     ScopedModel cascade;
     ScopedModel postFilter;
