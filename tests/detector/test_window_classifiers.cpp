@@ -1,5 +1,8 @@
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <cmath>
+#include <cstring>
 #include <random>
 #include <vector>
 
@@ -8,30 +11,11 @@
 #include "core/Errors.h"
 #include "detector/CascadeStage.h"
 #include "detector/HaarFeature.h"
+#include "detector/ScaleFeatures.h"
 #include "detector/WindowFeature.h"
 #include "support/ScopedModel.h"
 
 namespace {
-
-CascadeStage stageWithThresholds(float t0, float t1, float t2, float t3, float t4, float t5, float t6)
-{
-    CascadeStage s;
-    const float t[7] = {t0, t1, t2, t3, t4, t5, t6};
-    for (int i = 0; i < 7; ++i)
-        s.binThresholds[i] = t[i];
-    s.scoreCount = 1;
-    for (int b = 0; b < 8; ++b)
-        s.binScores[0][b] = static_cast<float>(b); // the score added is the bin
-    s.rejectThreshold[0] = -1e30f;
-    return s;
-}
-
-int binOf(CascadeStage const& s, float value)
-{
-    float scores[15] = {};
-    s.UpdateScoreAndThreshold(value, scores);
-    return static_cast<int>(scores[0]);
-}
 
 struct RandomIntegral {
     std::vector<unsigned char> px;
@@ -45,26 +29,6 @@ struct RandomIntegral {
     }
 };
 
-HaarFeature makeFeature(std::vector<HaarRect> rects)
-{
-    HaarFeature f;
-    f.Init(static_cast<int>(rects.size()));
-    for (size_t i = 0; i < rects.size(); ++i)
-        f.rects[i] = rects[i];
-    return f;
-}
-
-HaarRect rect(float weight, int left, int top, int right, int bottom)
-{
-    HaarRect r;
-    r.weight = weight;
-    r.left = left;
-    r.top = top;
-    r.right = right;
-    r.bottom = bottom;
-    return r;
-}
-
 // Loads one stage record written by CascadeWriter.
 void loadStage(CascadeModelStage const& written, CascadeStage& stage, WindowFeature& feature)
 {
@@ -75,89 +39,63 @@ void loadStage(CascadeModelStage const& written, CascadeStage& stage, WindowFeat
     stage.Init(reader, &feature);
 }
 
+// A feature of `kind`; for HAAR, `count` random rectangles inside a
+// size x size window with random weights (fractions included, so that the
+// accumulation order shows in the last bit).
+WindowFeature randomFeature(int kind, int count, int size, int stride, std::mt19937& rng)
+{
+    WindowFeature f;
+    f.kind = kind;
+    if (kind != WindowFeature::HAAR)
+        return f;
+    f.haar = new HaarFeature();
+    f.haar->Init(count);
+    std::uniform_real_distribution<float> weight(-9.0f, 9.0f);
+    for (int i = 0; i < count; ++i) {
+        HaarRect& r = f.haar->rects[i];
+        r = HaarRect();
+        r.left = static_cast<int>(rng() % (size - 1));
+        r.top = static_cast<int>(rng() % (size - 1));
+        r.right = r.left + 1 + static_cast<int>(rng() % (size - r.left - 1));
+        r.bottom = r.top + 1 + static_cast<int>(rng() % (size - r.top - 1));
+        r.weight = weight(rng) / 7.0f;
+    }
+    f.prepareOffsets(stride);
+    return f;
+}
+
+bool sameBits(float a, float b)
+{
+    return std::memcmp(&a, &b, sizeof a) == 0;
+}
+
+// A HAAR feature's weighted pixel sums at (x, y), counted pixel by pixel.
+double bruteForce(RandomIntegral const& img, HaarFeature const& f, int x, int y)
+{
+    double total = 0.0;
+    for (int i = 0; i < f.count; ++i) {
+        HaarRect const& r = f.rects[i];
+        for (int yy = y + r.top; yy < y + r.bottom; ++yy)
+            for (int xx = x + r.left; xx < x + r.right; ++xx)
+                total += r.weight * double(img.px[size_t(yy) * (img.image.stride - 1) + xx]);
+    }
+    return total;
+}
+
+struct Pool {
+    WindowFeature* features = nullptr;
+    int count = -1;
+    Pool(int w, int h, int minW, int minH, float shift, float grow)
+    {
+        features = WindowFeature::generateFeaturePool(w, h, minW, minH, shift, grow, &count);
+    }
+    ~Pool() { WindowFeature::destroyFeaturePool(features); }
+};
+
+
 } // namespace
 
-TEST(StageBins, HigherValuesFallInLowerBinsAndTiesGoUp)
-{
-    const CascadeStage s = stageWithThresholds(60, 50, 40, 30, 20, 10, 0);
-    EXPECT_EQ(binOf(s, 100), 0);
-    EXPECT_EQ(binOf(s, 60), 0);
-    EXPECT_EQ(binOf(s, 59.9f), 1);
-    EXPECT_EQ(binOf(s, 50), 1);
-    EXPECT_EQ(binOf(s, 45), 2);
-    EXPECT_EQ(binOf(s, 35), 3);
-    EXPECT_EQ(binOf(s, 30), 3);
-    EXPECT_EQ(binOf(s, 29.9f), 4);
-    EXPECT_EQ(binOf(s, 10), 5);
-    EXPECT_EQ(binOf(s, 5), 6);
-    EXPECT_EQ(binOf(s, 0), 6);
-    EXPECT_EQ(binOf(s, -1), 7);
-}
-
-TEST(StageScores, SingleScoreIgnoresTheSentinelAndSurvivesAtItsThreshold)
-{
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
-    for (int b = 0; b < 8; ++b)
-        s.binScores[0][b] = 2.0f;
-    s.rejectThreshold[0] = -18.0f;
-    float scores[15] = {-20.0f};
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(1.0f, scores)); // -20 + 2 = -18: equal survives
-    EXPECT_EQ(scores[0], -18.0f);
-    s.rejectThreshold[0] = -15.0f;
-    EXPECT_TRUE(s.UpdateScoreAndThreshold(1.0f, scores));
-}
-
-TEST(StageScores, DeadScoresStayDeadAndRejectionNeedsAllDead)
-{
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
-    s.scoreCount = 3;
-    for (int i = 0; i < 3; ++i)
-        for (int b = 0; b < 8; ++b)
-            s.binScores[i][b] = 1.0f;
-    s.rejectThreshold[0] = 0.5f;
-    s.rejectThreshold[1] = 5.0f; // will die
-    s.rejectThreshold[2] = 1.0f; // equal survives
-    float scores[15] = {0.0f, 0.0f, 0.0f};
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(0.0f, scores));
-    EXPECT_EQ(scores[0], 1.0f);
-    EXPECT_EQ(scores[1], -20.0f);
-    EXPECT_EQ(scores[2], 1.0f);
-    // A dead score gets no bin score.
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(0.0f, scores));
-    EXPECT_EQ(scores[1], -20.0f);
-    s.rejectThreshold[0] = s.rejectThreshold[2] = 100.0f;
-    EXPECT_TRUE(s.UpdateScoreAndThreshold(0.0f, scores));
-}
-
-TEST(StageScores, NoScoresRejectsAtOnce)
-{
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
-    s.scoreCount = 0;
-    float scores[15] = {};
-    EXPECT_TRUE(s.UpdateScoreAndThreshold(3.0f, scores));
-}
-
-TEST(StageScores, RemapBranchesOneScoreIntoSeveral)
-{
-    CascadeStage s = stageWithThresholds(0, 0, 0, 0, 0, 0, 0);
-    s.scoreCount = 3;
-    s.remapFlag = 1;
-    s.remap[0] = 0;
-    s.remap[1] = 0;
-    s.remap[2] = 2; // a slot never written reads 0
-    for (int i = 0; i < 3; ++i) {
-        for (int b = 0; b < 8; ++b)
-            s.binScores[i][b] = float(i + 1);
-        s.rejectThreshold[i] = -100.0f;
-    }
-    float scores[15] = {4.0f, 9.0f, 0.0f};
-    EXPECT_FALSE(s.UpdateScoreAndThreshold(1.0f, scores));
-    EXPECT_EQ(scores[0], 5.0f);
-    EXPECT_EQ(scores[1], 6.0f);
-    EXPECT_EQ(scores[2], 3.0f);
-}
-
-TEST(StageLoading, RecordRoundTripsThroughTheWriter)
+TEST(StageLoading, RecordRoundTripsThroughTheWriterAndUnknownKindsReadNoFeature)
 {
     CascadeModelStage w = CascadeWriter::stump(
         CascadeWriter::haar({{2.5f, 1, 2, 5, 9}, {-1.0f, 0, 0, 24, 24}}), 0.75f, 1.0f, -1.0f, -3.0f);
@@ -165,162 +103,183 @@ TEST(StageLoading, RecordRoundTripsThroughTheWriter)
     CascadeStage stage;
     WindowFeature feature;
     loadStage(w, stage, feature);
-    EXPECT_EQ(stage.scoreCount, 1);
-    EXPECT_EQ(stage.remapFlag, 0);
-    EXPECT_EQ(stage.binThresholds[0], 7.0f);
-    EXPECT_EQ(stage.binThresholds[6], 1.0f);
-    EXPECT_EQ(stage.binScores[0][3], 1.0f);
-    EXPECT_EQ(stage.binScores[0][4], -1.0f);
-    EXPECT_EQ(stage.rejectThreshold[0], -3.0f);
-    EXPECT_EQ(stage.feature, &feature);
-    ASSERT_EQ(feature.kind, 1);
+    EXPECT_EQ(std::vector<float>({stage.binThresholds[6], stage.binScores[0][3], stage.binScores[0][4]}),
+              std::vector<float>({1, 1, -1}));
     ASSERT_EQ(feature.haar->count, 2);
     // Stored left, top, right, bottom; held left, right, top, bottom.
     const HaarRect& r = feature.haar->rects[0];
-    EXPECT_EQ(r.weight, 2.5f);
-    EXPECT_EQ(r.left, 1);
-    EXPECT_EQ(r.top, 2);
-    EXPECT_EQ(r.right, 5);
-    EXPECT_EQ(r.bottom, 9);
-}
+    EXPECT_EQ(std::vector<float>({r.weight, float(r.left), float(r.top), float(r.right), float(r.bottom)}),
+              std::vector<float>({2.5f, 1, 2, 5, 9}));
 
-TEST(StageLoading, UnknownFeatureKindReadsNoFeatureBytesAndTheStageGoesOn)
-{
-    CascadeModelStage w = CascadeWriter::stump(CascadeWriter::deviation(), 0.5f, 1.0f, -1.0f, -3.0f);
+    // A kind no model should carry reads no feature bytes: the stage goes on.
+    w.feature = CascadeWriter::deviation();
     w.feature.kind = 7;
-    CascadeStage stage;
-    WindowFeature feature;
-    loadStage(w, stage, feature);
-    EXPECT_EQ(feature.kind, 7);
-    EXPECT_EQ(stage.binThresholds[3], 0.5f);
-    EXPECT_EQ(stage.rejectThreshold[0], -3.0f);
+    CascadeStage next;
+    WindowFeature odd;
+    loadStage(w, next, odd);
+    EXPECT_EQ(odd.kind, 7);
+    EXPECT_EQ(next.rejectThreshold[0], -3.0f);
     RandomIntegral img(30, 30, 1);
-    EXPECT_EQ(feature.Eval(img.image, 0.5f, 0), 0.0f);
+    EXPECT_EQ(odd.Eval(img.image, 0.5f, 0), 0.0f);
 }
 
 TEST(StageLoading, RejectsMalformedRecordsWithADataError)
 {
-    auto expectRejected = [](CascadeModelStage const& w, const char* what) {
+    auto scores = [](int count, std::vector<int32_t> remap) {
+        CascadeModelStage s = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
+        s.scoreCount = count;
+        s.binScores.resize(size_t(std::max(count, 0)));
+        s.rejectThresholds.resize(size_t(std::max(count, 0)));
+        s.remapFlag = remap.empty() ? 0 : 1;
+        s.remap = remap;
+        return s;
+    };
+    auto rects = [](std::vector<CascadeModelRect> r) {
+        return CascadeWriter::stump(CascadeWriter::haar(std::move(r)), 0, 0, 0, 0);
+    };
+    const struct {
+        const char* what;
+        CascadeModelStage stage;
+        bool loads;
+    } cases[] = {
+        {"scoreCount 16", scores(16, {}), false},
+        {"scoreCount -1", scores(-1, {}), false},
+        {"remap entry 2 of 2 scores", scores(2, {0, 2}), false},
+        {"remap entry -1", scores(2, {-1, 0}), false},
+        {"15 scores, remap in range", scores(15, std::vector<int32_t>(15, 14)), true},
+        {"right 25", rects({{1, 0, 0, 25, 24}}), false},
+        {"left -1", rects({{1, -1, 0, 4, 4}}), false},
+        {"empty rect", rects({{1, 4, 4, 4, 8}}), false},
+        {"65 rectangles", rects(std::vector<CascadeModelRect>(65, CascadeModelRect{1, 0, 0, 1, 1})), false},
+        {"the whole window", rects({{1, 0, 0, 24, 24}}), true},
+    };
+    for (auto const& c : cases) {
         CascadeStage stage;
         WindowFeature feature;
-        EXPECT_THROW(loadStage(w, stage, feature), qv_data_error) << what;
-    };
-    CascadeModelStage many = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
-    many.scoreCount = 16;
-    expectRejected(many, "scoreCount 16");
-    CascadeModelStage negative = many;
-    negative.scoreCount = -1;
-    expectRejected(negative, "scoreCount -1");
-    CascadeModelStage remap = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
-    remap.scoreCount = 2;
-    remap.binScores.resize(2);
-    remap.rejectThresholds.resize(2);
-    remap.remapFlag = 1;
-    remap.remap = {0, 2};
-    expectRejected(remap, "remap entry 2 of 2 scores");
-    remap.remap = {-1, 0};
-    expectRejected(remap, "remap entry -1");
-    expectRejected(CascadeWriter::stump(CascadeWriter::haar({{1, 0, 0, 25, 24}}), 0, 0, 0, 0), "right 25");
-    expectRejected(CascadeWriter::stump(CascadeWriter::haar({{1, -1, 0, 4, 4}}), 0, 0, 0, 0), "left -1");
-    expectRejected(CascadeWriter::stump(CascadeWriter::haar({{1, 4, 4, 4, 8}}), 0, 0, 0, 0), "empty rect");
-    CascadeModelStage rects = CascadeWriter::stump(CascadeWriter::haar({}), 0, 0, 0, 0);
-    rects.feature.rects.assign(65, CascadeModelRect{1, 0, 0, 1, 1});
-    expectRejected(rects, "65 rectangles");
-
-    // Valid edge: 15 scores with an in-range remap loads.
-    CascadeModelStage full = CascadeWriter::stump(CascadeWriter::deviation(), 0, 0, 0, 0);
-    full.scoreCount = 15;
-    full.binScores.resize(15);
-    full.rejectThresholds.resize(15);
-    full.remapFlag = 1;
-    full.remap.assign(15, 14);
-    CascadeStage stage;
-    WindowFeature feature;
-    EXPECT_NO_THROW(loadStage(full, stage, feature));
-    EXPECT_EQ(stage.remap[0], 14);
-}
-
-TEST(StageLoading, HeaderCheckOnlyReports)
-{
-    std::vector<uint8_t> bytes;
-    for (int v : {24, 24, 7, 24, 20, 7})
-        CascadeWriter::putInt(bytes, v);
-    ScopedModel model("classifierheader", bytes);
-    ModelReader reader("classifierheader", ModelReader::RAW);
-    EXPECT_TRUE(CascadeStage::checkHeader(reader));
-    EXPECT_FALSE(CascadeStage::checkHeader(reader));
-}
-
-TEST(HaarEvaluation, PreparedOffsetsAgreeWithCoordinatesAndBruteForce)
-{
-    RandomIntegral img(40, 30, 2);
-    for (int n : {1, 2, 3, 4}) {
-        std::vector<HaarRect> rects;
-        for (int i = 0; i < n; ++i)
-            rects.push_back(rect(0.5f * (i + 1) * (i % 2 ? -1 : 1), i, 2 * i, 10 + i, 12 + i));
-        HaarFeature f = makeFeature(rects);
-        f.prepareOffsets(img.image.stride);
-        const int x = 7, y = 5;
-        float expected = 0.0f;
-        for (auto const& r : rects) {
-            unsigned sum = 0;
-            for (int yy = y + r.top; yy < y + r.bottom; ++yy)
-                for (int xx = x + r.left; xx < x + r.right; ++xx)
-                    sum += img.px[size_t(yy) * 40 + xx];
-            expected += float(sum) * r.weight;
-        }
-        expected *= 0.125f;
-        EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, y * img.image.stride + x), expected) << n;
-        EXPECT_FLOAT_EQ(f.Eval(img.image, 0.125f, x, y), expected) << n;
+        if (c.loads)
+            EXPECT_NO_THROW(loadStage(c.stage, stage, feature)) << c.what;
+        else
+            EXPECT_THROW(loadStage(c.stage, stage, feature), qv_data_error) << c.what;
     }
 }
 
-TEST(HaarEvaluation, OffsetsFollowTheStride)
+TEST(HaarScaling, RoundedAreasCorrectTheWeightAndOnlyKnownKindsCopy)
 {
-    RandomIntegral narrow(30, 30, 3), wide(50, 30, 3);
-    HaarFeature f = makeFeature({rect(1.0f, 2, 3, 8, 9), rect(-1.0f, 0, 0, 4, 4)});
-    f.prepareOffsets(wide.image.stride);
-    EXPECT_FLOAT_EQ(f.Eval(wide.image, 1.0f, 4 * wide.image.stride + 6), f.Eval(wide.image, 1.0f, 6, 4));
-    f.prepareOffsets(narrow.image.stride);
-    EXPECT_FLOAT_EQ(f.Eval(narrow.image, 1.0f, 4 * narrow.image.stride + 6), f.Eval(narrow.image, 1.0f, 6, 4));
-}
-
-TEST(HaarScaling, UnitScaleCopiesAndRoundedAreasCorrectTheWeight)
-{
-    HaarFeature base = makeFeature({rect(2.0f, 1, 1, 4, 4), rect(-1.0f, 0, 0, 24, 24)});
-    HaarFeature same(&base, 1.0f);
-    ASSERT_EQ(same.count, 2);
-    EXPECT_EQ(same.rects[0].left, 1);
-    EXPECT_EQ(same.rects[0].right, 4);
-    EXPECT_EQ(same.rects[0].weight, 2.0f);
-
-    HaarFeature scaled(&base, 1.25f);
+    CascadeStage stage;
+    WindowFeature base;
+    loadStage(CascadeWriter::stump(CascadeWriter::haar({{2, 1, 1, 4, 4}, {-1, 0, 0, 24, 24}}), 0, 0, 0, 0), stage,
+              base);
+    HaarFeature scaled(base.haar, 1.25f);
     // 1 -> 1.75 -> 1 (trunc of 1.75), 4 -> 5.5 -> 5: 4 x 4 pixels for 3 x 3.
-    EXPECT_EQ(scaled.rects[0].left, 1);
-    EXPECT_EQ(scaled.rects[0].right, 5);
-    EXPECT_EQ(scaled.rects[0].top, 1);
-    EXPECT_EQ(scaled.rects[0].bottom, 5);
+    EXPECT_EQ(std::vector<int>({scaled.rects[0].left, scaled.rects[0].top, scaled.rects[0].right,
+                                scaled.rects[0].bottom}),
+              std::vector<int>({1, 1, 5, 5}));
     EXPECT_FLOAT_EQ(scaled.rects[0].weight, 2.0f * 9.0f / 16.0f);
     EXPECT_EQ(scaled.rects[1].right, 30);
     EXPECT_FLOAT_EQ(scaled.rects[1].weight, -576.0f / 900.0f);
-
     HaarFeature none;
     EXPECT_FALSE(none.Init(nullptr, 2.0f));
-}
 
-TEST(HaarScaling, DeviationFeatureStaysItselfAndUnknownKindsDoNotCopy)
-{
-    WindowFeature dev;
+    WindowFeature dev, copy, odd, empty;
     dev.kind = WindowFeature::DEVIATION;
-    WindowFeature copy;
     EXPECT_TRUE(copy.Init(&dev, 3.7f));
-    EXPECT_EQ(copy.kind, WindowFeature::DEVIATION);
     RandomIntegral img(30, 30, 4);
-    EXPECT_EQ(copy.Eval(img.image, 0.25f, 0), 0.25f);
-
-    WindowFeature odd;
+    EXPECT_EQ(copy.Eval(img.image, 0.25f, 0), 0.25f) << "the deviation feature stays itself";
     odd.kind = 5;
     EXPECT_FALSE(copy.Init(&odd, 1.0f));
-    WindowFeature empty;
     EXPECT_EQ(empty.Eval(img.image, 0.25f, 0), 0.0f);
+}
+
+TEST(FeaturePoolShapes, FirstIsTheDeviationFeatureAndTheRestStayInsideTheWindow)
+{
+    Pool pool(20, 16, 2, 2, 0.25f, 1.25f);
+    ASSERT_GT(pool.count, 1);
+    EXPECT_EQ(pool.features[0].kind, WindowFeature::DEVIATION);
+    for (int i = 1; i < pool.count; ++i) {
+        WindowFeature const& f = pool.features[i];
+        ASSERT_EQ(f.kind, WindowFeature::HAAR);
+        ASSERT_TRUE(f.haar->count == 2 || f.haar->count == 4);
+        for (int r = 0; r < f.haar->count; ++r) {
+            HaarRect const& rect = f.haar->rects[r];
+            ASSERT_TRUE(0 <= rect.left && rect.left < rect.right && rect.right <= 20) << i;
+            ASSERT_TRUE(0 <= rect.top && rect.top < rect.bottom && rect.bottom <= 16) << i;
+        }
+    }
+}
+
+TEST(FeaturePoolLimits, DegenerateArgumentsNeitherLoopNorCrash)
+{
+    Pool none(0, 0, 1, 1, 0.5f, 1.2f);
+    EXPECT_EQ(none.count, 1);
+    Pool zeroMin(6, 6, 0, -3, 0.0f, 0.0f); // cells start at one pixel
+    EXPECT_GT(zeroMin.count, 1);
+    int count = -7;
+    EXPECT_EQ(WindowFeature::generateFeaturePool(100000, 100000, 1, 1, 0.0f, 1.0f, &count), nullptr);
+    EXPECT_EQ(count, -7);
+    WindowFeature::destroyFeaturePool(nullptr);
+}
+
+TEST(ScaleFeatures, WalkGivesTheFeaturesOwnValuesBitForBit)
+{
+    // Rectangle counts around the straight-line cases 2 and 4, the
+    // deviation feature, an empty one and a kind no model should carry.
+    struct Case {
+        int kind;
+        int count;
+    };
+    const Case chain[] = {{1, 2}, {1, 4}, {1, 1}, {2, 0}, {1, 3}, {0, 0}, {1, 5}, {7, 0}, {1, 0}, {1, 2}};
+    for (const int width : {40, 97, 320}) {
+        SCOPED_TRACE(width);
+        std::mt19937 rng(static_cast<unsigned>(width));
+        RandomIntegral img(width, 60, rng());
+        IN_IMAGE const& image = img.image;
+
+        // The chain as common stages, and again split into two branches.
+        std::vector<WindowFeature> common;
+        std::vector<std::vector<WindowFeature>> branches(2);
+        for (const Case& c : chain)
+            common.push_back(randomFeature(c.kind, c.count, 36, image.stride, rng));
+        for (const Case& c : chain)
+            branches[branches[0].size() < 4 ? 0 : 1].push_back(randomFeature(c.kind, c.count, 36, image.stride, rng));
+
+        ScaleFeatures laidOut;
+        ASSERT_TRUE(laidOut.build(common, branches, image.stride));
+        EXPECT_EQ(laidOut.stride(), image.stride);
+        for (const int x : {0, 1, width - 37})
+            for (const int y : {0, 3, 60 - 37}) {
+                const int offset = x + image.stride * y;
+                const float deviation = 1.0f / 3.0f;
+                ScaleFeatures::Cursor cursor = laidOut.common();
+                for (size_t i = 0; i < common.size(); ++i, cursor.next()) {
+                    const float value = common[i].Eval(image, deviation, offset);
+                    EXPECT_TRUE(sameBits(cursor.value(image.data + offset, deviation), value))
+                        << "common feature " << i << " at " << x << "," << y;
+                    if (common[i].kind == WindowFeature::HAAR) {
+                        const double expected = bruteForce(img, *common[i].haar, x, y) * deviation;
+                        EXPECT_NEAR(value, expected, 1e-5 * std::fabs(expected) + 1e-3) << i;
+                    }
+                }
+                for (size_t b = 0; b < branches.size(); ++b) {
+                    ScaleFeatures::Cursor walk = laidOut.branch(static_cast<int>(b));
+                    for (size_t j = 0; j < branches[b].size(); ++j, walk.next())
+                        EXPECT_TRUE(sameBits(walk.value(image.data + offset, deviation),
+                                             branches[b][j].Eval(image, deviation, offset)))
+                            << "branch " << b << " feature " << j;
+                }
+            }
+    }
+}
+
+TEST(ScaleFeatures, HaarFeatureWithoutRectanglesCountsZero)
+{
+    // A feature whose rectangles could not be allocated is laid out empty
+    // rather than followed into a null array.
+    std::vector<WindowFeature> common(1);
+    common[0].kind = WindowFeature::HAAR;
+    common[0].haar = new HaarFeature();
+    common[0].haar->count = 3; // rects stays null
+    ScaleFeatures laidOut;
+    ASSERT_TRUE(laidOut.build(common, {}, 30));
+    const uint32_t integral[4] = {1, 2, 3, 4};
+    EXPECT_EQ(laidOut.common().value(integral, 0.5f), 0.0f);
 }

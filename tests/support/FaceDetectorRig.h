@@ -20,30 +20,6 @@ inline CascadeModel singleBranch(CascadeModel model)
     return model;
 }
 
-// The square cascade whose score tells contrast apart: a square of full
-// contrast (kDark on kBright) scores 7, which the post filter passes without a
-// look; a square of half that contrast scores 1.
-inline CascadeModel contrastScoredCascade()
-{
-    CascadeModel model = squareCascade(10, 0.0f);
-    model.common.back() = CascadeWriter::stump(CascadeWriter::deviation(), 0.015f, 1.0f, 7.0f, -1e30f);
-    return singleBranch(model);
-}
-
-constexpr unsigned char kHalfBright = 120;
-
-// Accepts a window whose left and top edges meet a bright block's corner,
-// whatever the block's size: the same corner is a hit at many window sizes.
-inline CascadeModel cornerCascade()
-{
-    CascadeModel model;
-    for (int i = 0; i < 10; ++i) model.common.push_back(passStage());
-    model.common.push_back(CascadeWriter::stump(squareEdge(0), 1.0f, 0.0f, -1.0f, -0.5f));
-    model.common.push_back(CascadeWriter::stump(squareEdge(2), 1.0f, 0.0f, -1.0f, -0.5f));
-    model.common.push_back(CascadeWriter::stump(CascadeWriter::deviation(), -1.0f, 1.0f, 1.0f, -1e30f));
-    return singleBranch(model);
-}
-
 struct FaceDetectorModels {
     ScopedModel cascade;
     ScopedModel postFilter;
@@ -52,14 +28,6 @@ struct FaceDetectorModels {
     // is above `passAbove` (hits of 6 or more pass without a look).
     explicit FaceDetectorModels(float bonus = 1.0f, float passAbove = 0.0f)
         : cascade("fdtest_cascade", CascadeWriter::toBytes(singleBranch(squareCascade(10, bonus)))),
-          postFilter("fdtest_ilabs", pftest::ilabsThresholdModel(0, {passAbove}))
-    {
-    }
-
-    // The contrast-scored cascade with the same post filter.
-    struct ContrastScored {};
-    FaceDetectorModels(ContrastScored, float passAbove)
-        : cascade("fdtest_cascade", CascadeWriter::toBytes(contrastScoredCascade())),
           postFilter("fdtest_ilabs", pftest::ilabsThresholdModel(0, {passAbove}))
     {
     }
