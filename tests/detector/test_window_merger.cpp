@@ -1,7 +1,9 @@
 #include <gtest/gtest.h>
 
+#include <tuple>
 #include <vector>
 
+#include "detector/MultiframeOptimizer.h"
 #include "detector/WindowMerger.h"
 #include "support/TrackSupport.h"
 
@@ -85,4 +87,22 @@ TEST(WindowMergerGroups, RectanglesAndScoresOfTheSurvivors)
     // The category of the member that set the best score picks the post filter's classifier.
     EXPECT_EQ(merge({hit(10, 10, 40, 40, 1.0f, 0), hit(12, 10, 42, 40, 3.0f, 1)})[0].category, 1);
 
+}
+
+// The exported motion predictor: motion comes only from two valid positions
+// in a row; an invalid one resets it.
+TEST(MultiframeOptimizerMotion, PredictsFromTheLastStepBetweenValidPositions)
+{
+    MultiframeOptimizer m;
+    int x = 0, y = 0, size = 0;
+    m.lastPosition(x, y, size);
+    EXPECT_EQ(std::make_tuple(x, y, size), std::make_tuple(-1, -1, -1));
+    m.updatePosition(true, 10, 20, 30);
+    m.updatePosition(true, 14, 17, 31);
+    m.predictedPosition(x, y, size);
+    EXPECT_EQ(std::make_tuple(x, y, size), std::make_tuple(18, 14, 31));
+    m.updatePosition(false, 50, 50, 50);
+    m.updatePosition(true, 60, 60, 50);
+    m.predictedPosition(x, y, size);
+    EXPECT_EQ(std::make_tuple(x, y, size), std::make_tuple(60, 60, 50));
 }
