@@ -359,7 +359,9 @@ TEST(CommandLine, BadInputEndsWithItsStatusAndAClearMessage) {
     SCOPED_TRACE(::testing::PrintToString(c.args) + "\n" + r.out + r.err);
     EXPECT_EQ(r.status, c.status);
     for (const std::string& part : c.parts) EXPECT_TRUE(contains(c.status == 0 ? r.out : r.err, part)) << part;
-    if (c.lines >= 0) EXPECT_EQ(std::count(r.out.begin(), r.out.end(), '\n'), c.lines);
+    if (c.lines >= 0) {
+      EXPECT_EQ(std::count(r.out.begin(), r.out.end(), '\n'), c.lines);
+    }
   }
 }
 
