@@ -39,34 +39,26 @@ std::set<std::string> exportedSymbols() {
     return names;
 }
 
-// One line of the allowed list: a whole name, or a prefix ending in '*'.
-struct AllowedEntry {
-    std::string text;
-    int line;
-    bool prefix;
-    bool matches(const std::string& symbol) const {
-        return prefix ? symbol.compare(0, text.size(), text) == 0 : symbol == text;
-    }
-};
-
-std::vector<AllowedEntry> allowedEntries() {
-    std::vector<AllowedEntry> entries;
+// The allowed list: whole names, or prefixes ending in '*'; '#' starts a comment line.
+std::vector<std::string> allowedEntries() {
+    std::vector<std::string> entries;
     std::ifstream in(QUORIN_EXPORTED_SYMBOLS_LIST);
-    std::string line;
-    for (int number = 1; std::getline(in, line); ++number) {
+    for (std::string line; std::getline(in, line);) {
         while (!line.empty() && (line.back() == ' ' || line.back() == '\r')) line.pop_back();
-        if (line.empty() || line[0] == '#') continue;
-        const bool prefix = line.back() == '*';
-        if (prefix) line.pop_back();
-        entries.push_back({line, number, prefix});
+        if (!line.empty() && line[0] != '#') entries.push_back(line);
     }
     return entries;
+}
+
+bool matches(const std::string& entry, const std::string& symbol) {
+    return entry.back() == '*' ? symbol.compare(0, entry.size() - 1, entry, 0, entry.size() - 1) == 0
+                               : symbol == entry;
 }
 
 TEST(SharedLibraryExports, MatchTheAllowedList) {
     const std::set<std::string> symbols = exportedSymbols();
     ASSERT_FALSE(symbols.empty()) << "nm found nothing in " << QUORIN_SHARED_LIBRARY;
-    const std::vector<AllowedEntry> entries = allowedEntries();
+    const std::vector<std::string> entries = allowedEntries();
     ASSERT_FALSE(entries.empty()) << "no entries read from " << QUORIN_EXPORTED_SYMBOLS_LIST;
     // Marks that the linker itself may define are not ours.
     const std::set<std::string> linkerMarks = {"_init", "_fini", "_edata", "_end", "__bss_start"};
@@ -75,7 +67,7 @@ TEST(SharedLibraryExports, MatchTheAllowedList) {
         if (linkerMarks.count(symbol) != 0) continue;
         bool allowed = false;
         for (size_t i = 0; i < entries.size(); ++i)
-            if (entries[i].matches(symbol)) {
+            if (matches(entries[i], symbol)) {
                 ++hits[i];
                 allowed = true;
             }
@@ -83,8 +75,8 @@ TEST(SharedLibraryExports, MatchTheAllowedList) {
                              << QUORIN_EXPORTED_SYMBOLS_LIST << " if it belongs to the public interface)";
     }
     for (size_t i = 0; i < entries.size(); ++i)
-        EXPECT_GT(hits[i], 0) << "missing exported symbol: \"" << entries[i].text << (entries[i].prefix ? "*" : "")
-                              << "\" (line " << entries[i].line << ") matches nothing the library exports";
+        EXPECT_GT(hits[i], 0) << "missing exported symbol: \"" << entries[i] << "\" of "
+                              << QUORIN_EXPORTED_SYMBOLS_LIST << " matches nothing the library exports";
 }
 
 TEST(SharedLibraryExports, RecordLabelsAndAttributeNamesAreNotLegible) {
