@@ -142,7 +142,8 @@ TEST_F(QuorinApiTest, ScaleFollowsTheRequestedTurnEvenWhenTheFrameWasNotTurned) 
                           {40, 20, 450, 20, {4, 2, 14, 12}, {1, 6, 8, 28}}};
     for (const Case& c : cases) {
         SCOPED_TRACE(c.rotation);
-        const Blocks out = detectOnce({makeFace(c.face[0], c.face[1], c.face[2], c.face[3], 1.0f)}, c.W, c.H, 1, c.rotation);
+        const FaceData face = makeFace(c.face[0], c.face[1], c.face[2], c.face[3], 1.0f);
+        const Blocks out = detectOnce({face}, c.W, c.H, 1, c.rotation);
         EXPECT_EQ(stages.frames.back().width, c.workWidth);
         EXPECT_EQ(rect(out), c.expected);
     }

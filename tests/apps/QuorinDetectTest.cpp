@@ -129,7 +129,8 @@ TEST(ImageDecoding, DamagedBytesGiveACleanImageOrImageError) {
   const Image rgb = pattern(48, 32, 3);
   for (const Bytes& good : {encodePng(rgb), jpegBytes(rgb), pgmBytes(toGray(rgb))}) {
     std::vector<Bytes> damaged;
-    for (std::size_t len = 0; len < good.size(); len += 1 + len / 16) damaged.emplace_back(good.begin(), good.begin() + len);
+    for (std::size_t len = 0; len < good.size(); len += 1 + len / 16)
+      damaged.emplace_back(good.begin(), good.begin() + len);
     for (int trial = 0; trial < 150; ++trial) {
       Bytes bad = good;
       for (int k = 0, flips = 1 + static_cast<int>(rng() % 8); k < flips; ++k)
@@ -153,8 +154,8 @@ TEST(OptionParsing, ReadsDefaultsInlineValuesDashFilesAndPicksTheEntry) {
   EXPECT_EQ(parseOptions({"--raw", "320x240"}).effectiveMode(), 1);
   const Options o = parseOptions({"--mode=0", "--rotation=270", "--", "-odd.png", "--mode"});
   EXPECT_EQ(std::make_pair(o.mode, o.rotation), std::make_pair(0, 270));
-  EXPECT_EQ(parseOptions({"--tracker=cpf", "--raw", "8x8"}).tracker, 4);
   EXPECT_EQ(o.images, (std::vector<std::string>{"-odd.png", "--mode"}));
+  EXPECT_EQ(parseOptions({"--tracker=cpf", "--raw", "8x8"}).tracker, 4);
   const std::vector<std::pair<std::vector<std::string>, Entry>> entries = {
       {{"a.png"}, Entry::Detect},
       {{"--scaled", "a.png"}, Entry::DetectScaled},
@@ -229,9 +230,8 @@ TEST(Annotation, ClipsAnyCoordinatesToTheImage) {
     Image small = pattern(31, 17, channels);
     int block[17];
     for (int i = 0; i < 17; ++i) block[i] = (i % 3 == 0) ? INT_MIN : (i % 3 == 1 ? INT_MAX : -5);
-    Face inverted;
-    inverted.left = 40, inverted.right = -40, inverted.top = 30, inverted.bottom = -30;
-    inverted.nose = {31, 17}, inverted.leftEye = {-1, -1};
+    // Roll, left, top, right, bottom, eyes and nose: a box turned inside out.
+    const Face inverted{0, 40, 30, -40, -30, {-1, -1}, {}, {31, 17}};
     std::vector<Face> faces = {faceFromBlock(block), inverted};
     for (int rot : {0, 90, 180, 270})
       for (Coordinates coords : {Coordinates::Scaled, Coordinates::Frame})

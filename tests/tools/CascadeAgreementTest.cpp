@@ -77,7 +77,8 @@ std::vector<char> opencvDecisions(cv::CascadeClassifier& cascade, const cv::Mat&
     for (int first = 0; first < total; first += chunk) {
         const int count = std::min(chunk, total - first);
         for (int k = 0; k < count; ++k) {
-            gray(cv::Rect((first + k) % cols, (first + k) / cols, kWindow, kWindow)).copyTo(stack(cv::Rect(0, k * kWindow, kWindow, kWindow)));
+            const cv::Rect window((first + k) % cols, (first + k) / cols, kWindow, kWindow);
+            gray(window).copyTo(stack(cv::Rect(0, k * kWindow, kWindow, kWindow)));
         }
         std::vector<cv::Rect> found;
         cascade.detectMultiScale(stack.rowRange(0, count * kWindow), found, 1.1, 0, 0, cv::Size(kWindow, kWindow),

@@ -101,7 +101,8 @@ TEST(CascadeTrainer, WrittenModelDecidesInTheEngineAsTrainedAndRestartsIdentical
     ASSERT_TRUE(trainCascade(pos, neg, 1).save(path));
     Cascade restored;
     ASSERT_TRUE(restored.load(path));
-    EXPECT_EQ(CascadeWriter::toBytes(trainCascade(pos, neg, 2, restored).toModel()), CascadeWriter::toBytes(c.toModel()));
+    EXPECT_EQ(CascadeWriter::toBytes(trainCascade(pos, neg, 2, restored).toModel()),
+              CascadeWriter::toBytes(c.toModel()));
     EXPECT_FALSE(restored.load(path + ".missing"));
     std::remove(path.c_str());
 

@@ -35,7 +35,8 @@ std::vector<int> blocks(std::vector<unsigned char> frame, int w, int h) {
 std::vector<std::string> detectorFaces(const std::string& cascade, const std::string& postFilter,
                                        const std::vector<unsigned char>& gray, int w, int h) {
     FaceDetector detector;
-    detector.init(R"({"detector":{"model":")" + cascade + R"(","imageMaxSize":1024,"faceMinSize":32,"faceMaxSize":1024},)"
+    detector.init(R"({"detector":{"model":")" + cascade +
+                  R"(","imageMaxSize":1024,"faceMinSize":32,"faceMaxSize":1024},)"
                   R"("postfilter":{"name":"ILABS_POSTFILTER","param":{"model":")" + postFilter + R"("}}})");
     std::vector<FaceData> faces;
     detector.detect(gray.data(), w, h, faces);

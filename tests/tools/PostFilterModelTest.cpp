@@ -84,7 +84,8 @@ TEST(BuiltinPostFilter, KeepsFacesAndRemovesFalseHitsOfTheMinedReportSplit) {
             t.facesKept += kept;
         }
     }
-    EXPECT_FALSE(f32.read(reinterpret_cast<char*>(feature.data()), sizeof(float))) << "hits.f32 is longer than hits.tsv";
+    EXPECT_FALSE(f32.read(reinterpret_cast<char*>(feature.data()), sizeof(float)))
+        << "hits.f32 is longer than hits.tsv";
     // Too few hits would make the shares meaningless.
     ASSERT_GE(report.faces, 100);
     ASSERT_GE(report.falseHits, 100);
