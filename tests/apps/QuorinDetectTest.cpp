@@ -230,8 +230,8 @@ TEST(Annotation, ClipsAnyCoordinatesToTheImage) {
     Image small = pattern(31, 17, channels);
     int block[17];
     for (int i = 0; i < 17; ++i) block[i] = (i % 3 == 0) ? INT_MIN : (i % 3 == 1 ? INT_MAX : -5);
-    // Roll, left, top, right, bottom, eyes and nose: a box turned inside out.
-    const Face inverted{0, 40, 30, -40, -30, {-1, -1}, {}, {31, 17}};
+    // Roll, left, top, right, bottom, eyes, nose, mouth corners: a box turned inside out.
+    const Face inverted{0, 40, 30, -40, -30, {-1, -1}, {}, {31, 17}, {}, {}};
     std::vector<Face> faces = {faceFromBlock(block), inverted};
     for (int rot : {0, 90, 180, 270})
       for (Coordinates coords : {Coordinates::Scaled, Coordinates::Frame})
