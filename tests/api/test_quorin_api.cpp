@@ -294,6 +294,8 @@ TEST_F(QuorinApiTest, HighSearchStartsFromTheLastWorkingTurnAndReportsIt) {
     EXPECT_EQ(turnsSeen(stages, 0, host, 60, 40), (std::vector<int>{0, 90, 90, 180, 270, 0}));
     EXPECT_EQ(sessionSnapshot().orientation, -1);
     int orientation = 12345;
+    EXPECT_EQ(quorin_detect360TrackingScaled_ornt(frame.data(), 60, 40, out.data(), 1, &orientation), 0);
+    EXPECT_EQ(orientation, -1) << "reported after a search that found nothing";
     stages.script = {{}, {makeFace(5, 5, 35, 35, 1.0f)}};
     EXPECT_EQ(quorin_detect360TrackingScaled_ornt(frame.data(), 60, 40, out.data(), 1, &orientation), 1);
     EXPECT_EQ(orientation, 90);
