@@ -15,6 +15,7 @@
 #include "core/ApiError.h"
 #include "core/Errors.h"
 #include "quorin/quorinapi.h"
+#include "support/ExpectThrow.h"
 #include "support/ScriptedStages.h"
 
 namespace {
@@ -28,14 +29,12 @@ using Faces = std::vector<FaceData>;
 constexpr int kSentinel = 0x5A5A5A5A;
 Blocks blocks(int count) { return Blocks(static_cast<size_t>(count) * 17, kSentinel); }
 const int* block(const Blocks& b, int k) { return b.data() + 17 * k; }
+// Ints 3..6 of the first block: top, bottom, left, right.
+Blocks rect(const Blocks& b) { return Blocks(b.begin() + 3, b.begin() + 7); }
 
 class QuorinApiTest : public ::testing::Test {
 protected:
-    void SetUp() override {
-        quorin_init();
-        stages.trackingModes.clear();
-        stages.searchSteps.clear();
-    }
+    void SetUp() override { quorin_init(); }
     void TearDown() override { quorin_release(); }
     // Runs one frame of W x H with `faces` and returns the blocks written.
     Blocks detectOnce(const Faces& faces, int W, int H, int maxFaces, int rotation, int* count = nullptr) {
@@ -51,8 +50,6 @@ protected:
     qtest::ScopedStages guard{stages};
 };
 
-// ---------------------------------------------------------------- session
-
 // Stand-ins whose construction fails, as engines with a broken model would.
 class FailingInitStages : public qtest::ScriptedStages {
 public:
@@ -65,23 +62,17 @@ TEST(QuorinSession, WithoutAWorkingSessionNothingIsTouched) {
     qtest::ScopedStages guard(stages);
     Frame frame = patternFrame(64, 48);
     Blocks out = blocks(2);
-    EXPECT_EQ(quorin_detect(frame.data(), 64, 48, out.data(), 2, 90), 0);
     EXPECT_EQ(quorin_detectScaled(frame.data(), 64, 48, out.data(), 2, 90), 0);
     EXPECT_EQ(quorin_detect360Tracking(frame.data(), 64, 48, out.data(), 2), 0);
-    EXPECT_EQ(quorin_detect360High(frame.data(), 64, 48, out.data(), 2), 0);
-    const int mode = sessionSnapshot().detectionMode;
-    EXPECT_NO_THROW(quorin_setDetectionMode(static_cast<unsigned>(mode)));
-    EXPECT_THROW(quorin_setDetectionMode(mode == 1 ? 2u : 1u), ApiError) << "a mode change needs a session";
-    quorin_release();
+    EXPECT_THROW(quorin_setDetectionMode(sessionSnapshot().detectionMode == 1 ? 2u : 1u), ApiError)
+        << "a mode change needs a session";
 
     // A failed init leaves a handle without buffers: every entry refuses.
     FailingInitStages failing;
     setPipelineStagesOverride(&failing);
     EXPECT_THROW(quorin_init(), ApiError);
-    EXPECT_TRUE(sessionSnapshot().open);
-    EXPECT_FALSE(sessionSnapshot().buffersAllocated);
+    EXPECT_TRUE(sessionSnapshot().open && !sessionSnapshot().buffersAllocated);
     EXPECT_THROW(quorin_detect(frame.data(), 64, 48, out.data(), 1, 0), ApiError);
-    EXPECT_THROW(quorin_detect360Tracking(frame.data(), 64, 48, out.data(), 1), ApiError);
     EXPECT_THROW(quorin_detect360High(frame.data(), 64, 48, out.data(), 1), ApiError);
     quorin_release();
     EXPECT_FALSE(sessionSnapshot().open);
@@ -89,29 +80,6 @@ TEST(QuorinSession, WithoutAWorkingSessionNothingIsTouched) {
     EXPECT_EQ(out, blocks(2));
     EXPECT_TRUE(stages.frames.empty() && failing.frames.empty());
 }
-
-TEST_F(QuorinApiTest, SessionStartsInHighModeAndModesChangeOnlyOnRealChange) {
-    quorin_init();  // again without release: the old session is dropped, not leaked
-    SessionSnapshot s = sessionSnapshot();
-    EXPECT_EQ(s.detectionMode, 2);
-    EXPECT_EQ(s.orientation, -1);
-    EXPECT_EQ(s.lastFrameWidth, -1);
-    stages.trackingModes.clear();
-    stages.searchSteps.clear();
-    quorin_setDetectionMode(2);
-    EXPECT_TRUE(stages.searchSteps.empty());
-    quorin_setDetectionMode(1);
-    quorin_setDetectionMode(1);  // the tracker survives a repeated request
-    quorin_setDetectionMode(7);  // unknown: mode and tracker stay
-    EXPECT_EQ(sessionSnapshot().detectionMode, 1);
-    quorin_setDetectionMode(0);
-    quorin_setDetectionMode(2);
-    const std::vector<std::pair<float, float>> steps = {{0.15f, 0.15f}, {0.15f, 0.15f}, {0.1f, 0.1f}};
-    EXPECT_EQ(stages.searchSteps, steps);
-    EXPECT_EQ(stages.trackingModes, (std::vector<QVFaceTrackingMode>{QV_TRACKING_KF, QV_TRACKING_NONE, QV_TRACKING_NONE}));
-}
-
-// ------------------------------------------------------- frame to work frame
 
 TEST_F(QuorinApiTest, WorkFrameIsShrunkToTheModesLongSideAndTurned) {
     Frame a = patternFrame(640, 480), b = patternFrame(1280, 1280), c = patternFrame(40, 20);
@@ -142,15 +110,14 @@ TEST_F(QuorinApiTest, WorkFrameIsShrunkToTheModesLongSideAndTurned) {
     EXPECT_EQ(stages.sizeRanges, ranges);
 }
 
-// ------------------------------------------------------------ result blocks
-
-TEST_F(QuorinApiTest, BlockHoldsRectangleLandmarksAndRollInHostPixels) {
+TEST_F(QuorinApiTest, BlockHoldsRollRectangleAndLandmarksInHostPixels) {
     FaceData face = makeFace(100, 50, 200, 170, 1.0f);
     const char* names[] = {"leftEye", "rightEye", "nose", "leftMouthCorner", "rightMouthCorner"};
     for (int i = 0; i < 5; ++i) face.setLandmark(names[i], Point2<float>(110.0f + 10 * i, 60.0f + 10 * i));
     int n = 0;
     Blocks out = detectOnce({face}, 640, 480, 1, 0, &n);
     EXPECT_EQ(n, 1);
+    // Roll, two untouched ints, the rectangle, eyes, mouth corners, nose.
     EXPECT_EQ(out, (Blocks{45, kSentinel, kSentinel, 50, 170, 100, 200, 110, 60, 120, 70, 140, 90, 150, 100, 130, 80}));
     EXPECT_EQ(stages.locateCalls, 1);
 
@@ -164,17 +131,22 @@ TEST_F(QuorinApiTest, BlockHoldsRectangleLandmarksAndRollInHostPixels) {
 }
 
 TEST_F(QuorinApiTest, ScaleFollowsTheRequestedTurnEvenWhenTheFrameWasNotTurned) {
-    // 640 x 480 at 90 is above the turn bound: analysed as it is, yet scaled
-    // as if turned (480/640 across, 640/480 down).
-    Blocks out = detectOnce({makeFace(100, 60, 300, 240, 1.0f)}, 640, 480, 1, 90);
-    EXPECT_EQ(stages.frames.back().width, 640);
-    EXPECT_EQ((Blocks{out[3], out[4], out[5], out[6]}), (Blocks{80, 320, 75, 225}));
-    // 45: neither turned nor swapped. 450: turned, but the scale isn't swapped.
-    out = detectOnce({makeFace(4, 2, 14, 12, 1.0f)}, 40, 20, 1, 45);
-    EXPECT_EQ((Blocks{out[3], out[4], out[5], out[6]}), (Blocks{2, 12, 4, 14}));
-    out = detectOnce({makeFace(4, 2, 14, 12, 1.0f)}, 40, 20, 1, 450);
-    EXPECT_EQ(stages.frames.back().width, 20);
-    EXPECT_EQ((Blocks{out[3], out[4], out[5], out[6]}), (Blocks{1, 6, 8, 28}));
+    struct Case {
+        int W, H, rotation, workWidth;
+        Blocks face, expected;  // left, top, right, bottom in; the block's order out
+    };
+    // 640 x 480 is above the turn bound: analysed as it is, yet scaled as if
+    // turned. 45 is neither turned nor swapped; 450 is turned, the scale not swapped.
+    const Case cases[] = {{640, 480, 90, 640, {100, 60, 300, 240}, {80, 320, 75, 225}},
+                          {40, 20, 45, 40, {4, 2, 14, 12}, {2, 12, 4, 14}},
+                          {40, 20, 450, 20, {4, 2, 14, 12}, {1, 6, 8, 28}}};
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.rotation);
+        const FaceData face = makeFace(c.face[0], c.face[1], c.face[2], c.face[3], 1.0f);
+        const Blocks out = detectOnce({face}, c.W, c.H, 1, c.rotation);
+        EXPECT_EQ(stages.frames.back().width, c.workWidth);
+        EXPECT_EQ(rect(out), c.expected);
+    }
 }
 
 TEST_F(QuorinApiTest, FacesAreOrderedByTheirTextScores) {
@@ -189,11 +161,12 @@ TEST_F(QuorinApiTest, FacesAreOrderedByTheirTextScores) {
 }
 
 TEST_F(QuorinApiTest, MaxFacesAndTheHundredBlockLimit) {
+    EXPECT_EQ(detectOnce({}, 320, 240, 2, 0), blocks(2)) << "no face: nothing written";
+    EXPECT_EQ(stages.locateCalls, 0);
     const Faces three = {makeFace(0, 0, 40, 40, 0.1f), makeFace(40, 0, 80, 40, 0.3f), makeFace(80, 0, 120, 40, 0.2f)};
     Frame frame = patternFrame(320, 240);
     stages.script.push_back(three);
     EXPECT_EQ(quorin_detect(frame.data(), 320, 240, nullptr, 0, 0), 0) << "0: detection runs, nothing written";
-    EXPECT_EQ(stages.frames.size(), 1u);
     int n = 0;
     Blocks out = detectOnce(three, 320, 240, 2, 0, &n);
     EXPECT_EQ(n, 2);
@@ -213,38 +186,20 @@ TEST_F(QuorinApiTest, MaxFacesAndTheHundredBlockLimit) {
     EXPECT_EQ(block(out, 100)[5], kSentinel);
 }
 
-TEST_F(QuorinApiTest, EmptyFramesTouchNothingAndResultsAreNeverSmoothed) {
-    Blocks out = detectOnce({}, 320, 240, 2, 0);
-    EXPECT_EQ(out, blocks(2));
-    EXPECT_EQ(stages.locateCalls, 0);
-    quorin_setDetectionMode(1);
-    detectOnce({makeFace(10, 10, 110, 110, 1.0f)}, 320, 240, 1, 0);
-    out = detectOnce({makeFace(20, 20, 120, 120, 1.0f)}, 320, 240, 1, 0);
-    EXPECT_EQ(out[5], 20);
-    EXPECT_EQ(sessionSnapshot().lastFrameWidth, -1);
-    EXPECT_EQ(sessionSnapshot().historyPresentCount, 0);
-}
-
 TEST_F(QuorinApiTest, HostileFacesFailOrSaturateWithoutUndefinedValues) {
     FaceData far = makeFace(10, 10, 110, 110, 1.0f);
     far.setLandmark("nose", Point2<float>(3e30f, -3e30f));
     Blocks out = detectOnce({far}, 320, 240, 1, 0);
-    EXPECT_EQ(out[15], INT_MAX);
-    EXPECT_EQ(out[16], INT_MIN);
+    EXPECT_EQ((Blocks{out[15], out[16]}), (Blocks{INT_MAX, INT_MIN}));
     stages.dropLandmarks = true;
-    try {
-        detectOnce({makeFace(10, 10, 110, 110, 1.0f)}, 320, 240, 1, 0);
-        FAIL() << "a face without landmarks can't be written";
-    } catch (const std::invalid_argument& e) {
-        EXPECT_STREQ(e.what(), "No value available for the input landmark");
-    }
+    expectThrowWith<std::invalid_argument>([&] { detectOnce({makeFace(10, 10, 110, 110, 1.0f)}, 320, 240, 1, 0); },
+                                           "No value available for the input landmark");
 }
-
-// ----------------------------------------------------------- scaled results
 
 TEST_F(QuorinApiTest, ScaledResultsReferToTheUnturnedHostFrame) {
     const int W = 300, H = 200;
     for (int rotation : {0, 90, 180, 270}) {
+        SCOPED_TRACE(rotation);
         const bool quarter = rotation == 90 || rotation == 270;
         const int tw = quarter ? H : W, th = quarter ? W : H;
         // A middle face with half-sides that map without remainder, and the
@@ -256,12 +211,12 @@ TEST_F(QuorinApiTest, ScaledResultsReferToTheUnturnedHostFrame) {
         Frame frame = patternFrame(W, H);
         Blocks out = blocks(1);
         ASSERT_EQ(quorin_detectScaled(frame.data(), W, H, out.data(), 1, rotation), 1);
-        EXPECT_EQ(out[3], -out[4]) << rotation;
-        EXPECT_EQ(out[5], -out[6]) << rotation;
-        EXPECT_LT(out[3], 0) << rotation;
-        EXPECT_LT(out[5], 0) << rotation;
-        EXPECT_NEAR(out[15], -600, 2 * 2000 / W) << rotation;  // (60, 150) in -1000..1000
-        EXPECT_NEAR(out[16], 500, 2 * 2000 / H) << rotation;
+        EXPECT_EQ(out[3], -out[4]);
+        EXPECT_EQ(out[5], -out[6]);
+        EXPECT_LT(out[3], 0);
+        EXPECT_LT(out[5], 0);
+        EXPECT_NEAR(out[15], -600, 2 * 2000 / W);  // (60, 150) in -1000..1000
+        EXPECT_NEAR(out[16], 500, 2 * 2000 / H);
     }
     // Past 100 faces the unwritten blocks are mapped as well; ints 1, 2 never.
     stages.script.push_back(Faces(101, makeFace(0, 0, 40, 40, 1.0f)));
@@ -271,22 +226,17 @@ TEST_F(QuorinApiTest, ScaledResultsReferToTheUnturnedHostFrame) {
     EXPECT_EQ((Blocks{block(out, 100)[1], block(out, 100)[4], block(out, 100)[5]}), (Blocks{160, 333, 0}));
 }
 
-// ------------------------------------------------------ orientation search
-
-// Which turn of `host` (W x H) a work frame shows: 0, 90, 180, 270, or -1.
+// Which turn of `host` (W x H) each work frame from `from` on shows: 0, 90, 180, 270, or -1.
 std::vector<int> turnsSeen(const qtest::ScriptedStages& stages, size_t from, const Frame& host, int W, int H) {
     std::vector<int> turns;
     for (size_t i = from; i < stages.frames.size(); ++i) {
-        const qtest::WorkFrame& work = stages.frames[i];
         int seen = -1;
         for (int rotation : {0, 90, 180, 270}) {
             Frame turned(host.size());
             int w = W, h = H;
-            if (!rotateFrame(turned.data(), host.data(), w, h, rotation) || w != work.width ||
-                work.pixels.size() != turned.size())
-                continue;
+            if (!rotateFrame(turned.data(), host.data(), w, h, rotation) || w != stages.frames[i].width) continue;
             const size_t compared = turned.size() - (rotation == 270 ? 1 : 0);  // 270 leaves its last byte
-            if (std::equal(turned.begin(), turned.begin() + compared, work.pixels.begin())) seen = rotation;
+            if (std::equal(turned.begin(), turned.begin() + compared, stages.frames[i].pixels.begin())) seen = rotation;
         }
         turns.push_back(seen);
     }
@@ -303,9 +253,7 @@ TEST_F(QuorinApiTest, TrackingSearchHoldsTheTurnThatWorkedForFiveFrames) {
     EXPECT_EQ(quorin_detect360Tracking(frame.data(), W, H, out.data(), 1), 1);
     EXPECT_EQ(turnsSeen(stages, 0, host, W, H), (std::vector<int>{0, 90, 180}));
     for (const auto& f : stages.frames) EXPECT_NE(f.pointer, frame.data()) << "the search works on a copy";
-    SessionSnapshot s = sessionSnapshot();
-    EXPECT_EQ((std::vector<int>{s.orientation, s.detectionMode, static_cast<int>(s.orientationHold)}),
-              (std::vector<int>{180, 0, 5}));
+    EXPECT_EQ(sessionSnapshot().detectionMode, 0);
 
     stages.script = {one};
     stages.trackingModes.clear();
@@ -322,22 +270,20 @@ TEST_F(QuorinApiTest, TrackingSearchHoldsTheTurnThatWorkedForFiveFrames) {
     EXPECT_EQ(turnsSeen(stages, before, host, W, H), (std::vector<int>{180, 180, 180, 180, 180, 180, 0, 90, 180, 270}));
     EXPECT_EQ(stages.trackingModes, (std::vector<QVFaceTrackingMode>{QV_TRACKING_KF, QV_TRACKING_NONE}));
     EXPECT_EQ(frame, host);
-}
 
-TEST_F(QuorinApiTest, TrackingSearchCopiesALargeFrameAnewForEachAttempt) {
     // 1280 x 960 in mode 0 is shrunk and then turned into the memory it was
     // given; each attempt must start again from the host's own frame.
-    const Frame host = patternFrame(1280, 960);
-    Frame frame = host;
-    Blocks out = blocks(1);
-    EXPECT_EQ(quorin_detect360Tracking(frame.data(), 1280, 960, out.data(), 1), 0);
-    EXPECT_EQ(frame, host);
+    const Frame large = patternFrame(1280, 960);
     Frame shrunk(240 * 180);
-    ASSERT_TRUE(resizeNearest(host.data(), 1280, 960, shrunk.data(), 240, 180));
-    EXPECT_EQ(turnsSeen(stages, 0, shrunk, 240, 180), (std::vector<int>{0, 90, 180, 270}));
+    ASSERT_TRUE(resizeNearest(large.data(), 1280, 960, shrunk.data(), 240, 180));
+    frame = large;
+    const size_t first = stages.frames.size();
+    EXPECT_EQ(quorin_detect360Tracking(frame.data(), 1280, 960, out.data(), 1), 0);
+    EXPECT_EQ(frame, large);
+    EXPECT_EQ(turnsSeen(stages, first, shrunk, 240, 180), (std::vector<int>{0, 90, 180, 270}));
 }
 
-TEST_F(QuorinApiTest, HighSearchStartsFromTheLastWorkingTurn) {
+TEST_F(QuorinApiTest, HighSearchStartsFromTheLastWorkingTurnAndReportsIt) {
     const Frame host = patternFrame(60, 40);
     Frame frame = host;
     Blocks out = blocks(1);
@@ -347,22 +293,15 @@ TEST_F(QuorinApiTest, HighSearchStartsFromTheLastWorkingTurn) {
     EXPECT_EQ(quorin_detect360High(frame.data(), 60, 40, out.data(), 1), 0);
     EXPECT_EQ(turnsSeen(stages, 0, host, 60, 40), (std::vector<int>{0, 90, 90, 180, 270, 0}));
     EXPECT_EQ(sessionSnapshot().orientation, -1);
-}
-
-TEST_F(QuorinApiTest, OrientationIsReportedAfterEverySearch) {
-    Frame frame = patternFrame(60, 40);
-    Blocks out = blocks(1);
     int orientation = 12345;
     EXPECT_EQ(quorin_detect360TrackingScaled_ornt(frame.data(), 60, 40, out.data(), 1, &orientation), 0);
-    EXPECT_EQ(orientation, -1);
+    EXPECT_EQ(orientation, -1) << "reported after a search that found nothing";
     stages.script = {{}, {makeFace(5, 5, 35, 35, 1.0f)}};
     EXPECT_EQ(quorin_detect360TrackingScaled_ornt(frame.data(), 60, 40, out.data(), 1, &orientation), 1);
     EXPECT_EQ(orientation, 90);
     EXPECT_THROW(quorin_detect360TrackingScaled_ornt(frame.data(), 60, 40, out.data(), 1, nullptr),
                  qv_invalid_argument);
 }
-
-// ------------------------------------------------------------ hostile input
 
 TEST_F(QuorinApiTest, BadFrameArgumentsAreRefusedWithoutChangingTheSession) {
     Frame frame = patternFrame(64, 48);

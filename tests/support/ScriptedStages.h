@@ -3,7 +3,7 @@
 
 // A test double for the detector and the part locator of the detection
 // pipeline: it hands out scripted face lists frame by frame and records what
-// the pipeline asked of it (the work frames, the size range, the modes).
+// the pipeline asked of it (the work frames, the size ranges, the tracking modes).
 
 #include <deque>
 #include <functional>
@@ -48,12 +48,11 @@ public:
 
     std::vector<WorkFrame> frames;
     std::vector<std::pair<int, int>> sizeRanges;
-    std::vector<std::pair<float, float>> searchSteps;
     std::vector<QVFaceTrackingMode> trackingModes;
     int locateCalls = 0;
 
     void setTrackingMode(QVFaceTrackingMode mode) override { trackingModes.push_back(mode); }
-    void setSearchStep(float x, float y) override { searchSteps.emplace_back(x, y); }
+    void setSearchStep(float, float) override {}
     void setFaceSizeRange(int lo, int hi) override { sizeRanges.emplace_back(lo, hi); }
 
     void detect(const unsigned char* pixels, int width, int height, std::vector<FaceData>& faces) override {

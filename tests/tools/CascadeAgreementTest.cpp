@@ -57,21 +57,10 @@ const std::vector<double> kDownscales = {1.0, 0.6, 0.4, 0.28, 0.2};
 
 struct Fixture {
     cv::CascadeClassifier opencv;
-    bool ready = false;
-    std::vector<uint8_t> payload = readConverted();
+    std::vector<uint8_t> payload = sourcetree::readBytes(sourcetree::path("models/mdcb-converted.bin"));
     ScopedModel converted{"mdcb_converted", payload};
-    static std::vector<uint8_t> readConverted() {
-        std::FILE* f = std::fopen((sourcetree::root() + "/models/mdcb-converted.bin").c_str(), "rb");
-        std::vector<uint8_t> bytes;
-        if (f == nullptr) return bytes;
-        for (int c; (c = std::fgetc(f)) != EOF;) bytes.push_back(static_cast<uint8_t>(c));
-        std::fclose(f);
-        return bytes;
-    }
-    Fixture() {
-        ready = opencv.load(kOpenCvCascade) && !payload.empty();
-        cv::setNumThreads(1);
-    }
+    bool ready = opencv.load(kOpenCvCascade) && !payload.empty();
+    Fixture() { cv::setNumThreads(1); }
 };
 
 cv::Mat loadGray(const std::string& path) { return cv::imread(path, cv::IMREAD_GRAYSCALE); }
@@ -81,18 +70,15 @@ cv::Mat loadGray(const std::string& path) { return cv::imread(path, cv::IMREAD_G
 // that OpenCV judges each exactly as in the photo (its normalisation stays
 // inside the window) and none falls between its search steps.
 std::vector<char> opencvDecisions(cv::CascadeClassifier& cascade, const cv::Mat& gray) {
-    const int cols = gray.cols - kWindow + 1;
-    const int rows = gray.rows - kWindow + 1;
-    const int total = cols * rows;
+    const int cols = gray.cols - kWindow + 1, total = cols * (gray.rows - kWindow + 1);
     std::vector<char> accepted(static_cast<size_t>(total), 0);
     const int chunk = 4096;
     cv::Mat stack(chunk * kWindow, kWindow, CV_8UC1);
     for (int first = 0; first < total; first += chunk) {
         const int count = std::min(chunk, total - first);
         for (int k = 0; k < count; ++k) {
-            const int x = (first + k) % cols;
-            const int y = (first + k) / cols;
-            gray(cv::Rect(x, y, kWindow, kWindow)).copyTo(stack(cv::Rect(0, k * kWindow, kWindow, kWindow)));
+            const cv::Rect window((first + k) % cols, (first + k) / cols, kWindow, kWindow);
+            gray(window).copyTo(stack(cv::Rect(0, k * kWindow, kWindow, kWindow)));
         }
         std::vector<cv::Rect> found;
         cascade.detectMultiScale(stack.rowRange(0, count * kWindow), found, 1.1, 0, 0, cv::Size(kWindow, kWindow),
@@ -109,8 +95,7 @@ std::vector<char> ourDecisions(CascadeDetector& detector, const cv::Mat& gray) {
     image.Init(gray.cols, gray.rows, static_cast<int>(gray.step), gray.data);
     detector.prepareForFastComputing(image.stride);
     detector.preparedWidth = image.pixelWidth();
-    const int cols = gray.cols - kWindow + 1;
-    const int rows = gray.rows - kWindow + 1;
+    const int cols = gray.cols - kWindow + 1, rows = gray.rows - kWindow + 1;
     std::vector<char> accepted(static_cast<size_t>(cols) * rows, 0);
     float score = 0, categories[16] = {};
     int stage = 0;
@@ -121,8 +106,8 @@ std::vector<char> ourDecisions(CascadeDetector& detector, const cv::Mat& gray) {
             w.top = y;
             w.right = x + kWindow;
             w.bottom = y + kWindow;
-            accepted[static_cast<size_t>(y) * cols + x] = detector.classify(
-                image, w, 0, 0.0f, CascadeDetector::CLASSIFY_PLAIN, &score, categories, &stage);
+            accepted[static_cast<size_t>(y) * cols + x] =
+                detector.classify(image, w, 0, 0.0f, CascadeDetector::CLASSIFY_PLAIN, &score, categories, &stage);
         }
     return accepted;
 }
@@ -168,13 +153,9 @@ TEST(CascadeAgreement, WindowDecisionsMatchOpenCvAtScaleOne) {
         const cv::Mat original = loadGray(devdata::photo(kWindowPhotos[p].name));
         ASSERT_FALSE(original.empty()) << kWindowPhotos[p].name;
         for (double factor : kDownscales) {
-            if (factor > kWindowPhotos[p].largest)
-                continue;
             cv::Mat gray = original;
-            if (factor != 1.0)
-                cv::resize(original, gray, cv::Size(), factor, factor, cv::INTER_AREA);
-            if (std::min(gray.cols, gray.rows) < kWindow)
-                continue;
+            if (factor != 1.0) cv::resize(original, gray, cv::Size(), factor, factor, cv::INTER_AREA);
+            if (factor > kWindowPhotos[p].largest || std::min(gray.cols, gray.rows) < kWindow) continue;
             const std::vector<char> ours = ourDecisions(detector, gray);
             const std::vector<char> theirs = opencvDecisions(f.opencv, gray);
             ASSERT_EQ(ours.size(), theirs.size());
@@ -190,8 +171,6 @@ TEST(CascadeAgreement, WindowDecisionsMatchOpenCvAtScaleOne) {
     const double agreement = 100.0 * static_cast<double>(agree) / static_cast<double>(windows);
     std::printf("windows %lld agreement %.4f%% accepted ours %lld opencv %lld both %lld\n", windows, agreement,
                 oursAccepted, theirsAccepted, both);
-    RecordProperty("windows", std::to_string(windows));
-    RecordProperty("agreement_percent", std::to_string(agreement));
     EXPECT_GE(agreement, 99.9);
     // Agreement on rejections alone says little: the accepted windows must
     EXPECT_GT(theirsAccepted, 0);
@@ -232,9 +211,6 @@ TEST(CascadeAgreement, GroupedFacesCoverOpenCvFaces) {
     const double matchedPercent = 100.0 * matched / theirsTotal;
     std::printf("photos %zu opencv faces %d matched %d (%.1f%%) ours %d extra %d\n", photos.size(), theirsTotal,
                 matched, matchedPercent, oursTotal, extra);
-    RecordProperty("opencv_faces", theirsTotal);
-    RecordProperty("matched_percent", std::to_string(matchedPercent));
-    RecordProperty("extra_faces", extra);
     EXPECT_GE(matchedPercent, 90.0);
     // Our extra boxes stay few: a cascade that accepts far more would
     // still match every face.

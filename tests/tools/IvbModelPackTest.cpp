@@ -22,26 +22,9 @@ namespace {
 
 const std::vector<std::string> kNames = {"mdcb", "mdnb", "mdpb"};
 
-// The stream the tool makes of the three payloads, served as model "mdivb".
-ScopedModel packedBuiltIns() {
-    const std::string out = sourcetree::scratchDir("pack_ivb_models") + "/models.ivb";
-    std::string command = std::string("'") + QUORIN_PACK_IVB_MODELS + "' '" + out + "'";
-    for (const std::string& name : kNames) command += " '" + sourcetree::path("models/" + name + ".bin") + "'";
-    EXPECT_EQ(std::system(command.c_str()), 0) << command;
-    return ScopedModel::raw("mdivb", sourcetree::readBytes(out));
-}
-
-// The payload of the named object: a raw-bytes basic object behind its header.
-std::vector<uint8_t> payloadThroughIvbMode(const std::string& name) {
-    const std::vector<uint8_t> object = ModelReader("mdivb::" + name, ModelReader::IVB).readObject();
-    if (object.size() < 16 || object[8] != 1 || object[9] != 1) return {};
-    return std::vector<uint8_t>(object.begin() + 16, object.end());
-}
-
 // Every 17-int block quorin_detect gives for the frame in mode 2.
-std::vector<int> blocks(const std::vector<unsigned char>& gray, int w, int h) {
+std::vector<int> blocks(std::vector<unsigned char> frame, int w, int h) {
     quorin_init();
-    std::vector<unsigned char> frame = gray;  // the entry may turn it in place
     std::vector<int> out(17 * 100);
     const int n = quorin_detect(frame.data(), w, h, out.data(), 100, 0);
     quorin_release();
@@ -62,28 +45,32 @@ std::vector<std::string> detectorFaces(const std::string& cascade, const std::st
     return out;
 }
 
-}  // namespace
+TEST(IvbModelPack, PayloadsComeBackThroughIvbModeAndFindTheSameFaces) {
+    const std::string out = sourcetree::scratchDir("pack_ivb_models") + "/models.ivb";
+    std::string command = std::string("'") + QUORIN_PACK_IVB_MODELS + "' '" + out + "'";
+    for (const std::string& name : kNames) command += " '" + sourcetree::path("models/" + name + ".bin") + "'";
+    ASSERT_EQ(std::system(command.c_str()), 0) << command;
+    const ScopedModel stream = ScopedModel::raw("mdivb", sourcetree::readBytes(out));
 
-TEST(IvbModelPack, BuiltInPayloadsComeBackThroughIvbMode) {
-    ScopedModel stream = packedBuiltIns();
+    // Each object, by name and in order, is a basic object of raw bytes
+    // holding the built-in payload as the library has it.
     ModelReader walk("mdivb", ModelReader::IVB);
+    std::vector<std::vector<uint8_t>> payloads;
     for (const std::string& name : kNames) {
         ModelReader raw(name, ModelReader::RAW);
         std::vector<uint8_t> builtIn(raw.rawSize());
         raw.read(builtIn.data(), 1, raw.rawSize());
         ASSERT_EQ(builtIn, sourcetree::readBytes(sourcetree::path("models/" + name + ".bin"))) << name;
-
         const std::vector<uint8_t> named = ModelReader("mdivb::" + name, ModelReader::IVB).readObject();
         ASSERT_EQ(named.size(), builtIn.size() + 16) << name;
         EXPECT_EQ(named[8], 1) << name;  // a basic object
         EXPECT_EQ(named[9], 1) << name;  // of raw bytes
-        EXPECT_TRUE(std::equal(builtIn.begin(), builtIn.end(), named.begin() + 16)) << name;
+        payloads.emplace_back(named.begin() + 16, named.end());
+        EXPECT_EQ(payloads.back(), builtIn) << name;
         EXPECT_EQ(walk.readObject(), named) << name;
     }
     EXPECT_TRUE(walk.readObject().empty());
-}
 
-TEST(IvbModelPack, EnginesFromIvbPayloadsFindTheSameFaces) {
     const std::string photo = devdata::photo("tracking_faces.jpg");
     if (!devdata::exists(photo)) GTEST_SKIP() << "photo tracking_faces.jpg: " << devdata::missingNote();
     int w = 0, h = 0, channels = 0;
@@ -92,13 +79,6 @@ TEST(IvbModelPack, EnginesFromIvbPayloadsFindTheSameFaces) {
     ASSERT_NE(pixels, nullptr) << photo;
     const std::vector<unsigned char> gray(pixels.get(), pixels.get() + static_cast<std::size_t>(w) * h);
 
-    ScopedModel stream = packedBuiltIns();
-    std::vector<std::vector<uint8_t>> payloads;
-    for (const std::string& name : kNames) {
-        payloads.push_back(payloadThroughIvbMode(name));
-        ASSERT_FALSE(payloads.back().empty()) << name;
-    }
-
     // A FaceDetector configured with the payloads under names of their own.
     const std::vector<std::string> builtInFaces = detectorFaces("mdcb", "mdpb", gray, w, h);
     ASSERT_GE(builtInFaces.size(), 3u) << "the photo shows three faces";
@@ -106,15 +86,14 @@ TEST(IvbModelPack, EnginesFromIvbPayloadsFindTheSameFaces) {
         ScopedModel cascade("ivb_cascade", payloads[0]), postFilter("ivb_postfilter", payloads[2]);
         EXPECT_EQ(detectorFaces("ivb_cascade", "ivb_postfilter", gray, w, h), builtInFaces);
     }
-
-    // The whole engine, landmark net included, with the payloads in place of
-    // the built-in ranges: the same 17-int blocks.
+    // The whole engine, landmark net included, with the payloads served in
+    // place of the built-in ranges: the same 17-int blocks.
     const std::vector<int> builtInBlocks = blocks(gray, w, h);
     ASSERT_EQ(builtInBlocks.size(), 17 * builtInFaces.size());
     std::vector<ScopedModel> served;
     served.reserve(kNames.size());
-    for (std::size_t i = 0; i < kNames.size(); ++i) served.emplace_back(kNames[i], payloads[i]);
     for (std::size_t i = 0; i < kNames.size(); ++i) {
+        served.emplace_back(kNames[i], payloads[i]);
         const uint8_t* begin = nullptr;
         const uint8_t* end = nullptr;
         ASSERT_TRUE(ModelRegistry::instance().findModel(kNames[i], begin, end));
@@ -122,3 +101,5 @@ TEST(IvbModelPack, EnginesFromIvbPayloadsFindTheSameFaces) {
     }
     EXPECT_EQ(blocks(gray, w, h), builtInBlocks);
 }
+
+}  // namespace
