@@ -20,19 +20,6 @@ std::unique_ptr<PostFilter> make(const std::string& name, const std::string& par
 
 } // namespace
 
-TEST(PostFilterFactoryNames, MakesBothFiltersByNameWithTheirModels)
-{
-    ScopedModel ilabs("pf_factory_ilabs", pftest::ilabsThresholdModel(0, {1.0f}));
-    ScopedModel svm("pf_factory_svm", postfilterwriters::svmModelPayload(pftest::svmThresholdModel(0, 1.0f),
-                                                                       pftest::svmThresholdModel(0, 1.0f)));
-    for (const char* name : {"ILABS_POSTFILTER", "LBP_SVM_POSTFILTER"})
-        EXPECT_NE(make(name, "{}"), nullptr) << name;
-    auto f = make("ILABS_POSTFILTER", "{\"model\":\"pf_factory_ilabs\"}");
-    ASSERT_NE(f, nullptr);
-    EXPECT_EQ(f->toJson(), "{\"model\":\"pf_factory_ilabs\"}");
-    EXPECT_NE(make("LBP_SVM_POSTFILTER", "{\"model\":\"pf_factory_svm\"}"), nullptr);
-}
-
 TEST(PostFilterFactoryNull, UnknownNamesParametersAndModelsGiveNull)
 {
     EXPECT_EQ(make("KF_TRACKER", "{}"), nullptr);
