@@ -90,8 +90,7 @@ TEST(FixedPoint, SigmoidFollowsItsTableAndSaturatesAtNine) {
 TEST(NetReader, LoadsEveryLayoutVersionAndTheOldOneDoesNotRun) {
     for (uint16_t version : {10, 11, 12, 13}) EXPECT_TRUE(loads(smallNet(version))) << version;
     LoadedNet old(smallNet(2));
-    ASSERT_TRUE(old.ok);
-    EXPECT_TRUE(old.run({1, 1, 1}).empty());  // no transfer types in this layout
+    EXPECT_TRUE(old.ok && old.run({1, 1, 1}).empty());  // no transfer types in this layout
     EXPECT_FALSE(loads(smallNet(3)));
     // A single soft-max output reports two values and has room for them.
     LoadedNet single(netwriter::denseNet({3, 1}, {0, TXF_SOFTMAX}, {1, 1}, 2));

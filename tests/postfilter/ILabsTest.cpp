@@ -135,67 +135,30 @@ TEST(ILabsClassifierLoad, RejectsCountsOutOfRange)
     }
 }
 
-TEST(ILabsPostFilter, HighScoresPassWholeAndInOrderWithoutAModel)
+TEST(ILabsPostFilter, HighScoresPassWholeAndTheRestMeetTheirCategorysModel)
 {
-    ILabsPostFilter f;
+    // From 6 on, hits pass whole and in order without a model; just below 6
+    // they go to the model, and there is none.
     std::vector<ScoredWindow> in = {hit(6.0f, 14, {3, 20, 2, 19}), hit(9.5f, 0), hit(6.25f, 7)};
-    std::vector<ScoredWindow> out = pftest::filterOnHalfRamp(f, in);
+    std::vector<ScoredWindow> out = pftest::filterOnHalfRamp(ILabsPostFilter(), in);
     ASSERT_EQ(out.size(), 3u);
     for (std::size_t i = 0; i < in.size(); ++i)
         EXPECT_TRUE(pftest::sameHit(out[i], in[i])) << i;
-    // Just below 6 goes to the model, and there is none.
-    EXPECT_THROW(pftest::filterOnHalfRamp(f, {hit(std::nextafter(6.0f, 0.0f), 0)}), qv_invalid_argument);
-}
-
-TEST(ILabsPostFilter, CascadeScoreIsTheFirstFeatureAndEachCategoryHasItsModel)
-{
-    // Category c passes a hit when its score is above c; 0 above is a rejection.
+    EXPECT_THROW(pftest::filterOnHalfRamp(ILabsPostFilter(), {hit(std::nextafter(6.0f, 0.0f), 0)}), qv_invalid_argument);
+    // The cascade score is the first feature: category c passes a hit when
+    // its score is above c; 0 above is a rejection.
     std::vector<float> biases;
     for (int c = 0; c < 15; ++c)
         biases.push_back(float(c));
     ScopedModel model("pf_ilabs_cats", pftest::ilabsThresholdModel(0, biases));
     ILabsPostFilter f("pf_ilabs_cats");
-    std::vector<ScoredWindow> out = pftest::filterOnHalfRamp(
+    out = pftest::filterOnHalfRamp(
         f, {hit(5.0f, 3), hit(5.0f, 5), hit(5.0f, 14), hit(5.0f, 4), hit(2.5f, 2), hit(2.0f, 2)});
     ASSERT_EQ(out.size(), 3u);
     EXPECT_EQ(out[0].category, 3);
     EXPECT_EQ(out[1].category, 4);
     EXPECT_EQ(out[2].score, 2.5f);
     EXPECT_THROW(pftest::filterOnHalfRamp(f, {hit(5.0f, 15)}), qv_invalid_argument);
-}
-
-TEST(ILabsPostFilter, HistogramIsTakenOnTheScaledPatchRowByRow)
-{
-    // The right half of the frame is flat: its top-right cell counts exactly
-    // 25 pixels of code 0, its bottom-left cell (ramp) none.
-    struct Case {
-        int bin;
-        float bias;
-        std::size_t passed;
-    };
-    const Case cases[] = {{pftest::binIndex(0, 3, 0), 24.5f, 1}, {pftest::binIndex(0, 3, 0), 25.0f, 0},
-                          {pftest::binIndex(3, 0, 0), 0.0f, 0}};
-    for (const Case& c : cases) {
-        ScopedModel model("pf_ilabs_cell", pftest::ilabsThresholdModel(c.bin, {c.bias}));
-        EXPECT_EQ(pftest::filterOnHalfRamp(ILabsPostFilter("pf_ilabs_cell"), {hit(1.0f, 0)}).size(), c.passed)
-            << c.bin << " above " << c.bias;
-    }
-}
-
-TEST(ILabsConfiguration, JsonAndModelOfAnotherFeatureLength)
-{
-    ScopedModel model("pf_ilabs_json", pftest::ilabsThresholdModel(0, {0.0f}));
-    ILabsPostFilter f;
-    f.fromJson("{ \"model\" : \"pf_ilabs_json\" }");
-    EXPECT_EQ(f.getClassifier().categoryCount(), 15);
-    EXPECT_EQ(f.toJson(), "{\"model\":\"pf_ilabs_json\"}");
-
-    // A well-formed model for 3 features cannot judge the 945 of a patch.
-    std::vector<IlabsCategory> cats(15);
-    for (auto& c : cats)
-        c.linear = {1, 1, 1};
-    ScopedModel shortModel("pf_ilabs_short", postfilterwriters::ilabsModelPayload(cats));
-    EXPECT_THROW(pftest::filterOnHalfRamp(ILabsPostFilter("pf_ilabs_short"), {hit(1.0f, 0)}), qv_data_error);
 }
 
 TEST(ILabsFeature, ToolMirrorGivesTheSameFeature)

@@ -122,24 +122,6 @@ TEST(SvmDecision, WrongFeatureLengthOrNoModelIsRefused)
     expectThrowWith<qv_data_error>([&] { c.classify(f, 3); }, "Incorrect PostFilter's feature length");
 }
 
-TEST(SvmModelLoad, ExpandsSparseVectorsAndReadsTwoModelsInSequence)
-{
-    SvmModelParams second = threeClassParams({0, 2, 0});
-    second.supportVectors[1] = {0, 0.75f, -2.5f};
-    ScopedModel model = serveSvms("pf_svm_pair", twoClassParams(-4.0f), second);
-    ModelReader reader("pf_svm_pair", ModelReader::RAW);
-    SvmClassifier a(reader);
-    SvmClassifier b(reader);
-    const SvmClassifier::SvmModel& m = b.getModel();
-    EXPECT_EQ(m.svTotal, 3);
-    EXPECT_EQ(m.labels, (std::vector<int32_t>{10, 20, 30}));
-    EXPECT_EQ(m.rho, (std::vector<float>{0, 2, 0}));
-    EXPECT_EQ(m.supportVectors[1], (std::vector<float>{0, 0.75f, -2.5f}));
-    EXPECT_EQ(m.coefficients, second.coefficients);
-    const float f2[2] = {2, 4};
-    EXPECT_EQ(a.classify(f2, 2), 7);
-}
-
 TEST(SvmModelLoad, EveryTruncationIsADataError)
 {
     std::vector<uint8_t> full = postfilterwriters::svmModelPayload(twoClassParams(0), threeClassParams({0, 0, 0}));
@@ -224,17 +206,5 @@ TEST(LbpSvmJudgement, HistogramIsTakenOnTheTransposedPatch)
     ScopedModel b = serveSvms("pf_svm_t03", svmThresholdModel(ramp, 0.0f), svmThresholdModel(ramp, 0.0f));
     EXPECT_EQ(pftest::filterOnHalfRamp(LbpSvmPostFilter("pf_svm_t30"), {hit(1.0f, 0)}).size(), 1u);
     EXPECT_EQ(pftest::filterOnHalfRamp(LbpSvmPostFilter("pf_svm_t03"), {hit(1.0f, 0)}).size(), 0u);
-}
-
-TEST(LbpSvmConfiguration, JsonAndModelOfAnotherLength)
-{
-    SvmModelParams shortModel = svmThresholdModel(0, 0.0f);
-    shortModel.featureLength = 10;
-    shortModel.supportVectors[0].resize(10);
-    ScopedModel m = serveSvms("pf_svm_short", shortModel, shortModel);
-    LbpSvmPostFilter f;
-    f.fromJson("{\"model\":\"pf_svm_short\"}");
-    EXPECT_EQ(f.toJson(), "{\"model\":\"pf_svm_short\"}");
-    EXPECT_THROW(pftest::filterOnHalfRamp(f, {hit(1.0f, 1)}), qv_data_error);
 }
 
