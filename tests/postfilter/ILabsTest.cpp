@@ -69,22 +69,6 @@ TEST(ILabsClassifier, ScoresTheQuadraticFormAndPassesStrictlyAboveZero)
         EXPECT_THROW(c.classify(category, kFeature, 3), qv_invalid_argument) << category;
 }
 
-TEST(ILabsClassifierLoad, ReadsFifteenQuantisedCategoriesInOrder)
-{
-    // Category c has bias 64 - c / 4: score 0 for category 0, then rising.
-    // Stored as int16 at scale 1/2, so an unscaled load scores differently.
-    std::vector<IlabsCategory> cats;
-    for (int c = 0; c < 15; ++c)
-        cats.push_back(handCategory(64.0f - c * 0.25f));
-    ScopedModel model("pf_ilabs_hand", postfilterwriters::ilabsModelPayload(cats));
-    ILabsClassifier classifier;
-    classifier.init("pf_ilabs_hand");
-    ASSERT_EQ(classifier.categoryCount(), 15);
-    for (int c = 0; c < 15; ++c)
-        EXPECT_EQ(classifier.categoryScore(c, kFeature, 3), c * 0.25f) << c;
-    EXPECT_THROW(ILabsClassifier().init("pf_no_such_model"), qv_data_error);
-}
-
 TEST(ILabsClassifierLoad, EveryTruncationIsADataErrorAndLeavesNoCategories)
 {
     std::vector<uint8_t> full = postfilterwriters::ilabsModelPayload(std::vector<IlabsCategory>(15, handCategory()));
@@ -94,6 +78,7 @@ TEST(ILabsClassifierLoad, EveryTruncationIsADataErrorAndLeavesNoCategories)
         EXPECT_THROW(classifier.init("pf_ilabs_cut"), qv_data_error) << "cut at " << n;
         EXPECT_EQ(classifier.categoryCount(), 0);
     }
+    EXPECT_THROW(ILabsClassifier().init("pf_no_such_model"), qv_data_error);
 }
 
 TEST(ILabsClassifierLoad, RejectsCountsOutOfRange)

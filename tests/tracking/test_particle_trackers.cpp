@@ -239,11 +239,6 @@ TEST_F(FaceScene, TrainingLeavesOutUnreadableWindowsAndKeepsARingOfFiveSets)
     }
     const size_t expected[5] = {110, 111, 107, 108, 109}; // rounds 10, 11, 7, 8, 9
     for (size_t s = 0; s < 5; ++s) EXPECT_EQ(boost.trainingSets[s].size(), expected[s]) << s;
-    std::vector<std::vector<float>> rows;
-    std::vector<bool> rowLabels;
-    boost.expandTrainData(rows, rowLabels);
-    EXPECT_EQ(rows.size(), 545u);
-    for (const auto& row : rows) ASSERT_EQ(row.size(), 10u);
 }
 
 TEST_F(FaceScene, CascadeFilterCopiesAndMovesPointAtTheirOwnObservers)
