@@ -17,17 +17,13 @@ using netwriter::NetDescription;
 
 namespace {
 
-// A linear landmark net on a side x side patch. Output o is bias[o] plus the
-// inputs listed for it (weight 1 each); version 10 without means leaves the
-// inputs as the locator gives them.
-NetDescription landmarkNet(int side, int outputs, const std::vector<int32_t>& biases,
-                           const std::vector<std::vector<int>>& taps = {}) {
+// A landmark net on a side x side patch whose outputs are its biases (all
+// weights 0), so the points do not depend on the pixels.
+NetDescription landmarkNet(int side, int outputs, std::vector<int32_t> biases) {
     const uint16_t n = uint16_t(side * side);
     NetDescription d = netwriter::denseNet({n, uint16_t(outputs)}, {0, TXF_LINEAR}, {1, 1}, 1, 0, true, 10);
+    biases.resize(outputs, 0);
     d.biases[1] = biases;
-    d.biases[1].resize(outputs, 0);
-    for (int o = 0; o < int(taps.size()); ++o)
-        for (int input : taps[o]) d.spans[1][input][0].weights[o] = 1;
     return d;
 }
 

@@ -19,14 +19,14 @@ using netwriter::Span;
 
 namespace {
 
-// A 3-4-2 net of the given version and last-layer type with fixed weights.
-NetDescription smallNet(uint16_t version = 12, uint32_t lastType = TXF_SOFTMAX) {
-    return netwriter::denseNet({3, 4, 2}, {0, TXF_SIGMOID, lastType}, {1, 16, 64}, 7, 300, true, version);
+// A 3-4-2 soft-max net of the given version with fixed weights.
+NetDescription smallNet(uint16_t version = 12) {
+    return netwriter::denseNet({3, 4, 2}, {0, TXF_SIGMOID, TXF_SOFTMAX}, {1, 16, 64}, 7, 300, true, version);
 }
 
 // An n-to-n linear net copying input i to output i (no biases).
-NetDescription identityNet(uint16_t n, uint16_t version = 12) {
-    NetDescription d = netwriter::denseNet({n, n}, {0, TXF_LINEAR}, {1, 1}, 1, 0, false, version);
+NetDescription identityNet(uint16_t n) {
+    NetDescription d = netwriter::denseNet({n, n}, {0, TXF_LINEAR}, {1, 1}, 1, 0, false);
     for (uint16_t i = 0; i < n; ++i) {
         std::vector<int16_t> w(n, 0);
         w[i] = 1;

@@ -56,8 +56,6 @@ TEST(ILabsClassifier, ScoresTheQuadraticFormAndPassesStrictlyAboveZero)
     EXPECT_THROW(m->getScore(kFeature, 2), qv_data_error);
 
     ILabsClassifier c;
-    EXPECT_TRUE(c.preClassify(6.0f));
-    EXPECT_FALSE(c.preClassify(std::nextafter(6.0f, 0.0f)));
     EXPECT_THROW(c.classify(0, kFeature, 3), qv_invalid_argument); // no model
     std::vector<std::unique_ptr<ILabsClassifier::CategoryModel>> models;
     models.push_back(asModel(handCategory(64.0f)));  // 62.5 + 1.5 - 64 = 0

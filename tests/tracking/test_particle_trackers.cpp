@@ -101,19 +101,13 @@ TEST_F(Particles, ResampleDrawsTheRequestedNumberFollowingTheWeight)
         for (const DetectionWindow& p : f.getParticles()) EXPECT_LT(p.left, present) << "drawn from the cloud";
     }
     // The cumulative table leaves the last weight out, so mass on one particle
-    // is drawn one place up (on the first: the first two), and NaN weights
-    // land at the top.
-    struct Weighted {
-        std::vector<float> weights;
-        int lowest, highest;
-    };
-    for (const Weighted& c : {Weighted{{0, 0, 1, 0}, 3, 3}, Weighted{{kNaN, kNaN, kNaN, kNaN}, 3, 3},
-                              Weighted{{1, 0, 0, 0}, 0, 1}}) {
+    // is drawn one place up, and NaN weights land at the top: still in the cloud.
+    for (const std::vector<float>& weights : {std::vector<float>{0, 0, 1, 0}, std::vector<float>(4, kNaN)}) {
         std::vector<DetectionWindow> p;
         for (int i = 0; i < 4; ++i) p.push_back(makeWindow(i, 0, i + 30, 30));
-        std::vector<float> w = c.weights;
+        std::vector<float> w = weights;
         particle_cloud::resample(p, w, 200);
-        for (const DetectionWindow& d : p) EXPECT_TRUE(d.left >= c.lowest && d.left <= c.highest) << d.left;
+        for (const DetectionWindow& d : p) EXPECT_EQ(d.left, 3);
     }
 }
 
@@ -144,13 +138,11 @@ TEST(PFTracker, MatchesOnTheMeanDropsUnconfirmedFacesAndNeedsADetector)
     PFTracker t;
     IN_IMAGE image(320, 240);
     t.update(image, {makeWindow(10, 10, 60, 60), makeWindow(200, 100, 250, 150)});
-    ASSERT_EQ(t.pfFaces.size(), 2u);
     // Overlap 0.28 with face 0 opens a new face; a small shift of face 1 keeps
     // it, with the velocity of its mean's centre: (3 + 6) / 2, toward zero.
     t.update(image, {makeWindow(38, 10, 88, 60), makeWindow(203, 100, 256, 150)});
     ASSERT_EQ(t.pfFaces.size(), 3u);
-    EXPECT_FALSE(t.pfFaces.alive[0]);
-    EXPECT_TRUE(t.pfFaces.alive[1] && t.pfFaces.alive[2]);
+    EXPECT_EQ(t.pfFaces.alive, std::vector<bool>({false, true, true}));
     EXPECT_EQ(t.pfFaces.items[1].velocityX, 4);
     // The faces live in the tracker's own list: the front end gets no previous
     // faces to follow and finds this tracker's faces by its search cells alone.
@@ -265,8 +257,6 @@ TEST_F(FaceScene, CascadeFilterCopiesAndMovesPointAtTheirOwnObservers)
         DetectionWindow w{};
         ASSERT_EQ(c->predict(image, &w), 1);
         EXPECT_GE(w.Overlap(truth), 0.5f);
-        EXPECT_EQ(c->filters[0].getParticles().size(), 3000u);
-        EXPECT_EQ(c->filters[1].getParticles().size(), 600u);
     }
 }
 

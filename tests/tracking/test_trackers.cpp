@@ -72,7 +72,7 @@ TEST(TrackerUpdate, SecondFrameMatchesByOverlapAndMovesWithTheCentre)
     };
     const Case cases[] = {
         {makeWindow(100, 100, 140, 140), {makeWindow(98, 103, 139, 140)}, {makeWindow(98, 103, 139, 140)}, -1, 1,
-         "an odd shift truncates toward zero"},
+         "follows its detection; an odd shift truncates toward zero"},
         {makeWindow(0, 0, 100, 100), {makeWindow(20, 0, 100, 80), makeWindow(10, 0, 100, 90)},
          {makeWindow(10, 0, 100, 90), makeWindow(20, 0, 100, 80)}, 5, -5, "0.81 beats 0.64, the other is new"},
         {makeWindow(0, 0, 100, 100), {makeWindow(0, 10, 100, 100), makeWindow(10, 0, 100, 100)},
