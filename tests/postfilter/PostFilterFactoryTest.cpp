@@ -25,8 +25,7 @@ std::unique_ptr<PostFilter> make(const std::string& name, const std::string& par
 
 TEST(PostFilterFactoryNull, UnknownNamesParametersAndModelsGiveNull)
 {
-    EXPECT_EQ(make("KF_TRACKER", "{}"), nullptr);
-    EXPECT_EQ(make("ilabs_postfilter", "{}"), nullptr);
+    EXPECT_EQ(make("ilabs_postfilter", "{}"), nullptr); // names are case-sensitive
     EXPECT_EQ(PostFilterFactory::instance().createInstance("{\"param\":{}}"), nullptr);
     EXPECT_EQ(make("ILABS_POSTFILTER"), nullptr); // no "param": an empty text is no object
     EXPECT_EQ(make("ILABS_POSTFILTER", "{\"model\":\"pf_nowhere\"}"), nullptr);

@@ -81,8 +81,8 @@ void loadInto(SvmClassifier& c, const std::vector<uint8_t>& bytes)
 
 TEST(SvmDecision, VotesStrictlyAboveTheThresholdAndTiesGoLow)
 {
-    SvmModelParams linear = twoClassParams(-1.0f);
-    linear.kernelType = 0; // kernel values 0: only rho and the threshold decide
+    SvmModelParams otherKernel = twoClassParams(-1.0f);
+    otherKernel.kernelType = 0; // only the polynomial kernel is known: the others give 0
     SvmModelParams single;
     single.classCount = 1;
     single.labels = {4};
@@ -97,10 +97,10 @@ TEST(SvmDecision, VotesStrictlyAboveTheThresholdAndTiesGoLow)
     const Case cases[] = {
         {twoClassParams(-4.0f), {2, 4}, 7, "-3.5 > -4: class 0"},
         {twoClassParams(-3.5f), {2, 4}, 9, "equal is not above"},
-        {linear, {2, 4}, 7, "-0.5 > -1"},
         {threeClassParams({0, 0, 0}), {1, 2, 3}, 10, "1:1:1, tie to class 0"},
         {threeClassParams({0, 2, 0}), {1, 2, 3}, 30, "pair (0,2) now -1"},
         {threeClassParams({0, 0, -0.5f}), {1, 2, 3}, 20, "pair (1,2) now 0.5"},
+        {otherKernel, {2, 4}, 7, "kernel 0, so -rho: -0.5 > -1"},
         {single, {1, 1}, 4, "one class"},
     };
     for (const Case& c : cases) {

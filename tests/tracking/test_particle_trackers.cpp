@@ -48,18 +48,9 @@ protected:
     void TearDown() override { particle_random::clearFixedSeed(); }
 };
 
-// The lattice of shifts around a window, labelled by an overlap of 0.9.
-void latticeAround(const DetectionWindow& w, std::vector<DetectionWindow>& windows, std::vector<bool>& labels)
-{
-    for (int dx = -5; dx <= 5; ++dx)
-        for (int dy = -5; dy <= 5; ++dy) {
-            windows.push_back(makeWindow(w.left + dx, w.top + dy, w.right + dx, w.bottom + dy));
-            labels.push_back(w.Overlap(windows.back()) >= 0.9f);
-        }
-}
-
 // The built-in cascade, a frame with the face at (120, 80), 64 pixels, and
-// the lattice around it; skips without the data cache.
+// the lattice of shifts around it labelled by an overlap of 0.9; skips
+// without the data cache.
 class FaceScene : public testing::Test {
 protected:
     void SetUp() override
@@ -68,7 +59,11 @@ protected:
         if (face.pixels.empty()) GTEST_SKIP() << devdata::missingNote();
         pixels = facesequence::frameWithFace(face, 320, 240, 120, 80);
         ASSERT_TRUE(image.Init(320, 240, 320, pixels.data()));
-        latticeAround(truth, windows, labels);
+        for (int dx = -5; dx <= 5; ++dx)
+            for (int dy = -5; dy <= 5; ++dy) {
+                windows.push_back(makeWindow(truth.left + dx, truth.top + dy, truth.right + dx, truth.bottom + dy));
+                labels.push_back(truth.Overlap(windows.back()) >= 0.9f);
+            }
         particle_random::fixSeed(5);
         particle_random::reseed();
     }
