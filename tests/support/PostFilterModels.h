@@ -15,7 +15,9 @@
 #include <vector>
 
 #include "PostFilterWriters.h"
+#include "image/IntegralImage.h"
 #include "image/ScoredWindow.h"
+#include "postfilter/PostFilter.h"
 #include "support/SourceTree.h"
 
 namespace pftest {
@@ -79,6 +81,16 @@ inline std::vector<uint8_t> halfRampFrame() {
     for (int y = 0; y < 24; ++y)
         for (int x = 0; x < 12; ++x) pixels[y * 24 + x] = static_cast<uint8_t>(10 * x + 5 * y);
     return pixels;
+}
+
+// What filter `f` lets through of `hits` on the half-ramp frame.
+inline std::vector<ScoredWindow> filterOnHalfRamp(const PostFilter& f, const std::vector<ScoredWindow>& hits) {
+    std::vector<uint8_t> pixels = halfRampFrame();
+    IN_IMAGE image;
+    image.Init(24, 24, 24, pixels.data());
+    std::vector<ScoredWindow> out;
+    f.filter(image, hits, &out);
+    return out;
 }
 
 // Noise over a slant, fixed seed: every code and every cell sees use.
