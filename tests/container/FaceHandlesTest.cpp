@@ -43,34 +43,40 @@ Bytes withByte(Bytes b, std::size_t at, uint8_t v) {
 
 }  // namespace
 
-TEST(QVFaceRepresentationTest, ReadsWritesAndCopiesDeeply) {
+TEST(IvbFaceHandles, GoldenBytesBothWaysAndDeepCopies) {
     QVFaceRepresentation representation;
-    EXPECT_EQ(representation.name(), "");
     representation.fromIvb(ivbgolden::byteBlob());
     EXPECT_EQ(representation.name(), "f");
     EXPECT_EQ(representation.toIvb(), ivbgolden::byteBlob());
-
     QVFaceRepresentation copy(representation);
-    QVFaceRepresentation assigned;
-    assigned = representation;
     representation.fromIvb(QVFaceRepresentation().toIvb());
-    EXPECT_EQ(representation.name(), "");
     EXPECT_EQ(copy.toIvb(), ivbgolden::byteBlob());
-    EXPECT_EQ(assigned.toIvb(), ivbgolden::byteBlob());
-    assigned = assigned;
-    EXPECT_EQ(assigned.name(), "f");
+
+    LDAModel lda;
+    lda.dimension = 2;
+    lda.projection = Eigen::Vector2f(0.5f, 0.25f);
+    lda.firstValue = 1.5f;
+    lda.secondValue = -2.0f;
+    EXPECT_EQ(FaceModelData(lda).toIvb(), ivbgolden::faceModel());
+    FaceModelData data;
+    data.fromIvb(ivbgolden::faceModel());
+    EXPECT_EQ(data.projection, lda.projection);
+    EXPECT_EQ(data.secondValue, -2.0f);
+    QVFaceModel model;
+    model.fromIvb(ivbgolden::faceModel());
+    QVFaceModel modelCopy(model);
+    model.fromIvb(QVFaceModel().toIvb());
+    EXPECT_EQ(modelCopy.toIvb(), ivbgolden::faceModel());
+    data.fromIvb(model.toIvb());
+    EXPECT_EQ(data.projection.size(), 0) << "an empty model reads back empty";
 }
 
-TEST(QVFaceRepresentationTest, DamagedBytesRaiseTheReadMessage) {
-    const std::string readFailed = "QVFaceRepresentation could not be read from IVB";
+TEST(IvbFaceHandles, DamagedRepresentationsAndHandlesWithoutValueRaise) {
     for (const Bytes& bad : {Bytes(), ivbgolden::emptyComposite(), ivbgolden::compositeWithFloats(),
                              withByte(ivbgolden::byteBlob(), 0, 0xB0)}) {
         QVFaceRepresentation representation;
-        expectApiError([&] { representation.fromIvb(bad); }, readFailed);
+        expectApiError([&] { representation.fromIvb(bad); }, "QVFaceRepresentation could not be read from IVB");
     }
-}
-
-TEST(QVFaceRepresentationTest, AHandleWithoutValueRefusesEveryOperation) {
     QVFaceRepresentation source;
     source.fromIvb(ivbgolden::byteBlob());
     failNoThrowNew = true;
@@ -82,48 +88,10 @@ TEST(QVFaceRepresentationTest, AHandleWithoutValueRefusesEveryOperation) {
     expectApiError([&] { broken.fromIvb(ivbgolden::byteBlob()); }, message);
     expectApiError([&] { source = broken; }, message);
     expectApiError([&] { broken = source; }, message);
-    QVFaceRepresentation copyOfBroken(broken);  // a fresh, empty value
-    EXPECT_EQ(copyOfBroken.name(), "");
+    EXPECT_EQ(QVFaceRepresentation(broken).name(), "") << "a copy of it is a fresh, empty value";
 }
 
-TEST(QVFaceModelTest, GoldenBytesBothWays) {
-    LDAModel lda;
-    lda.dimension = 2;
-    lda.projection = Eigen::Vector2f(0.5f, 0.25f);
-    lda.firstValue = 1.5f;
-    lda.secondValue = -2.0f;
-    EXPECT_EQ(FaceModelData(lda).toIvb(), ivbgolden::faceModel());
-
-    QVFaceModel model;
-    model.fromIvb(ivbgolden::faceModel());
-    EXPECT_EQ(model.toIvb(), ivbgolden::faceModel());
-    FaceModelData data;
-    data.fromIvb(ivbgolden::faceModel());
-    EXPECT_EQ(data.dimension, 2);
-    EXPECT_EQ(data.projection, Eigen::Vector2f(0.5f, 0.25f));
-    EXPECT_EQ(data.firstValue, 1.5f);
-    EXPECT_EQ(data.secondValue, -2.0f);
-}
-
-TEST(QVFaceModelTest, EmptyProjectionAndDeepCopies) {
-    const Bytes empty = QVFaceModel().toIvb();
-    FaceModelData data;
-    data.fromIvb(empty);
-    EXPECT_EQ(data.dimension, 0);
-    EXPECT_EQ(data.projection.size(), 0);
-
-    QVFaceModel a;
-    a.fromIvb(ivbgolden::faceModel());
-    QVFaceModel b(a);
-    b.fromIvb(empty);
-    EXPECT_EQ(a.toIvb(), ivbgolden::faceModel());
-    EXPECT_EQ(b.toIvb(), empty);
-    b = a;
-    a.fromIvb(empty);
-    EXPECT_EQ(b.toIvb(), ivbgolden::faceModel());
-}
-
-TEST(QVFaceModelTest, DamagedModelsFailAndLeaveTheValue) {
+TEST(IvbFaceHandles, DamagedModelsFailAndLeaveTheValue) {
     const Bytes good = ivbgolden::faceModel();
     // Offsets: dimension value at 36, projection object size at 96.
     Bytes huge = withByte(withByte(good, 36, 0xFF), 37, 0xFF);

@@ -1,12 +1,11 @@
 #pragma once
 // Expects f to throw an E whose what() is exactly message.
-#include <functional>
 #include <string>
 
 #include <gtest/gtest.h>
 
-template <typename E>
-void expectThrowWith(const std::function<void()>& f, const std::string& message) {
+template <typename E, typename F>
+void expectThrowWith(F&& f, const std::string& message) {
     try {
         f();
         ADD_FAILURE() << "no exception, expected: " << message;
