@@ -1,13 +1,33 @@
+// IVB objects: the hand-written byte layouts in both directions, the
+// unpacker's lookup and refusals, and damaged or lying bytes of every object
+// kind stored in this format (blob, face model, representation).
+
 #include <gtest/gtest.h>
 
-#include <functional>
+#include <new>
 
+#include "container/FaceModelData.h"
 #include "container/IvbBytes.h"
+#include "core/ApiError.h"
 #include "core/Errors.h"
 #include "quorin/DataBlob.h"
+#include "quorin/QVFaceModel.h"
+#include "quorin/QVFaceRepresentation.h"
 #include "quorin/QVIVBObject.h"
 #include "support/ExpectThrow.h"
 #include "support/IvbGolden.h"
+
+// Lets a test make the no-throw allocation fail, as on an exhausted heap. The
+// ordinary allocation does the work otherwise, so that deletes still match.
+static bool failNoThrowNew = false;
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
+    if (failNoThrowNew) return nullptr;
+    try {
+        return ::operator new(size);
+    } catch (...) {
+        return nullptr;
+    }
+}
 
 namespace {
 
@@ -37,6 +57,11 @@ Bytes composite(const std::vector<Bytes>& entries) {
     return object(ivb::kComposite, 0, body);
 }
 
+Bytes withByte(Bytes b, std::size_t at, uint8_t v) {
+    b[at] = v;
+    return b;
+}
+
 }  // namespace
 
 TEST(IvbGolden, CompositeLayoutsBothWays) {
@@ -61,13 +86,13 @@ TEST(IvbGolden, CompositeLayoutsBothWays) {
     EXPECT_EQ(std::vector<float>(back, back + 2), std::vector<float>(values, values + 2));
 }
 
+// The range of a property is stored for unsigned types only: the UINT32
+// property carries it, the BYTES property of the blob does not.
 TEST(IvbGolden, DataPropertyAndBlobBothWays) {
     EXPECT_EQ(DataProperty(DataProperty::UINT32, 2, 3, 1).toIvb(), ivbgolden::uint32Property());
     DataProperty property;
     property.fromIvb(ivbgolden::uint32Property());
     EXPECT_EQ(property.toIvb(), ivbgolden::uint32Property());
-    EXPECT_EQ(property.maxVal(), 0xFFFFFFFFFFFFFFFFull);
-
     DataBlob blob;
     blob.setName("f");
     blob.init(DataProperty(DataProperty::BYTES, 1, 1, 2));
@@ -76,26 +101,40 @@ TEST(IvbGolden, DataPropertyAndBlobBothWays) {
     EXPECT_EQ(blob.toIvb(), ivbgolden::byteBlob());
     DataBlob back;
     back.fromIvb(ivbgolden::byteBlob());
-    EXPECT_EQ(back.name(), "f");
-    EXPECT_EQ(back.bytePointer()[1], 0xCD);
     EXPECT_EQ(back.toIvb(), ivbgolden::byteBlob());
 }
 
+TEST(IvbGolden, FaceHandlesBothWaysAndCopiesAreDeep) {
+    LDAModel lda;
+    lda.dimension = 2;
+    lda.projection = Eigen::Vector2f(0.5f, 0.25f);
+    lda.firstValue = 1.5f;
+    lda.secondValue = -2.0f;
+    EXPECT_EQ(FaceModelData(lda).toIvb(), ivbgolden::faceModel());
+    QVFaceModel model;
+    model.fromIvb(ivbgolden::faceModel());
+    QVFaceModel modelCopy(model);
+    model.fromIvb(QVFaceModel().toIvb());
+    EXPECT_EQ(modelCopy.toIvb(), ivbgolden::faceModel());
+
+    QVFaceRepresentation representation;
+    representation.fromIvb(ivbgolden::byteBlob());
+    EXPECT_EQ(representation.name(), "f");
+    QVFaceRepresentation copy(representation);
+    representation.fromIvb(QVFaceRepresentation().toIvb());
+    EXPECT_EQ(copy.toIvb(), ivbgolden::byteBlob());
+}
+
 TEST(IvbUnpacker, LookupRules) {
-    const Bytes one = object(ivb::kBasic, 9, {1, 0, 0, 0});
-    const Bytes two = object(ivb::kBasic, 9, {2, 0, 0, 0});
-    const Bytes three = object(ivb::kBasic, 9, {3, 0, 0, 0});
     QVIVBCompositeObjectUnpacker unpacker;
-    unpacker.parse(composite({entry("", 4, one), entry("", 4, two), entry("named", 6, three)}));
-    ASSERT_EQ(unpacker.objects().size(), 3u);
-    EXPECT_EQ(unpacker.getObjId("", 4), 1u);  // the later duplicate wins
-    EXPECT_EQ(unpacker.getObjId("", 6), 2u);
+    unpacker.parse(composite({entry("", 4, object(ivb::kBasic, 9, {1, 0, 0, 0})),
+                              entry("", 4, object(ivb::kBasic, 9, {2, 0, 0, 0})),
+                              entry("named", 6, object(ivb::kBasic, 9, {3, 0, 0, 0}))}));
+    EXPECT_EQ(unpacker.getObjId("", 4), 1u);         // the later duplicate wins
     EXPECT_EQ(unpacker.getObjId("named", 999), 2u);  // a name makes the tag irrelevant
     expectThrowWith<std::invalid_argument>([&] { unpacker.getObjId("", 0); }, "Invalid argument passed");
-    expectThrowWith<qv_data_error>([&] { unpacker.getObjId("", 8); }, "Could not find corresponding object id");
-    expectThrowWith<qv_data_error>([&] { unpacker.getObjId("other", 4); }, "Could not find corresponding object id");
-    unpacker.release();
-    EXPECT_TRUE(unpacker.objects().empty());
+    for (const char* name : {"", "other"})
+        expectThrowWith<qv_data_error>([&] { unpacker.getObjId(name, 8); }, "Could not find corresponding object id");
 }
 
 TEST(IvbUnpacker, BasicObjectErrors) {
@@ -114,42 +153,28 @@ TEST(IvbUnpacker, BasicObjectErrors) {
     QVIVBObjectSubType st;
     unsigned int count = 0, unsignedValue = 0;
     int value = 0;
-    const std::string conversion = "QV IVB object conversion error";
-    const std::vector<std::pair<std::function<void()>, std::string>> cases = {
-        {[&] { unpacker.getBasicObjectPropertyImpl(0, st, count); }, "Invalid IVB sub type"},
-        {[&] { unpacker.getBasicObjectPropertyImpl(1, st, count); }, conversion},  // sub type 0
-        {[&] { unpacker.getBasicObjectPropertyImpl(2, st, count); }, "Not a valid basic IVB object id"},
-        {[&] { unpacker.getBasicObjectPropertyImpl(3, st, count); }, conversion},  // 3 bytes of int
-        {[&] { unpacker.getBasicObjectPropertyImpl(7, st, count); }, "Not a valid object id"},
-        {[&] { unpacker.getBasicObjectPropertyImpl(5, st, count); }, conversion},  // size field below 16
-        {[&] { unpacker.unpackBasicObjectImpl(5, &value); }, conversion},
-        {[&] { unpacker.unpackBasicObjectImpl(7, &value); }, conversion},          // no such object
-        {[&] { unpacker.unpackBasicObjectImpl(2, &value); }, conversion},          // composite
-        {[&] { unpacker.unpackBasicObjectImpl(4, &unsignedValue); }, conversion},  // no conversion
-        {[&] { unpacker.unpackBasicObjectImpl(4, &value, 0); }, conversion},       // no room
-    };
-    for (const auto& c : cases) {
-        SCOPED_TRACE(&c - &cases[0]);
-        expectThrowWith<std::exception>(c.first, c.second);
-    }
+    expectThrowWith<std::invalid_argument>([&] { unpacker.getBasicObjectPropertyImpl(0, st, count); },
+                                           "Invalid IVB sub type");
+    expectThrowWith<std::invalid_argument>([&] { unpacker.getBasicObjectPropertyImpl(2, st, count); },
+                                           "Not a valid basic IVB object id");
+    expectThrowWith<std::invalid_argument>([&] { unpacker.getBasicObjectPropertyImpl(7, st, count); },
+                                           "Not a valid object id");
+    // Sub type 0, 3 bytes of int, a size field below 16.
+    for (uint32_t id : {1u, 3u, 5u}) EXPECT_THROW(unpacker.getBasicObjectPropertyImpl(id, st, count), qv_ivb_conversion_error);
+    // Size below 16, no such object, a composite.
+    for (uint32_t id : {5u, 7u, 2u}) EXPECT_THROW(unpacker.unpackBasicObjectImpl(id, &value), qv_ivb_conversion_error);
+    EXPECT_THROW(unpacker.unpackBasicObjectImpl(4, &unsignedValue), qv_ivb_conversion_error);  // no conversion
+    EXPECT_THROW(unpacker.unpackBasicObjectImpl(4, &value, 0), qv_ivb_conversion_error);       // no room
     unpacker.unpackBasicObjectImpl(4, &value, 1);
     EXPECT_EQ(value, 7);
 }
 
 TEST(IvbUnpacker, MalformedCompositesAreRefused) {
     const Bytes good = ivbgolden::compositeWithFloats();
-    auto withSize = [](Bytes b, uint64_t size) {
-        ivb::putU64(b.data(), size);
-        return b;
-    };
-    auto withByte = [](Bytes b, std::size_t at, uint8_t v) {
-        b[at] = v;
-        return b;
-    };
     const std::vector<std::pair<const char*, Bytes>> cases = {
         {"shorter than a header", Bytes(15, 0)},
-        {"size one past the length", withSize(good, good.size() + 1)},
-        {"size one short of the length", withSize(good, good.size() - 1)},
+        {"size one past the length", withByte(good, 0, static_cast<uint8_t>(good.size() + 1))},
+        {"size one short of the length", withByte(good, 0, static_cast<uint8_t>(good.size() - 1))},
         {"kind basic", withByte(good, 8, 1)},
         {"composite with a sub type", withByte(good, 9, 3)},
         {"one to three stray bytes", composite({Bytes{0, 0, 1}})},
@@ -165,24 +190,28 @@ TEST(IvbUnpacker, MalformedCompositesAreRefused) {
     }
 }
 
-TEST(IvbUnpacker, EveryTruncationAndByteDamageOfABlobFailsCleanly) {
-    const Bytes good = ivbgolden::byteBlob();
-    for (std::size_t n = 0; n < good.size(); ++n) {
-        DataBlob blob;
-        EXPECT_THROW(blob.fromIvb(Bytes(good.begin(), good.begin() + n)), qv_ivb_conversion_error) << n;
-    }
-    // Every byte set to each of a few values: either a blob whose bytes agree
-    // with its property, or an exception; never an overrun (ASan watches).
-    for (std::size_t i = 0; i < good.size(); ++i) {
-        for (uint8_t v : {0x00, 0x01, 0x10, 0x7F, 0xFF}) {
-            Bytes damaged = good;
-            damaged[i] = v;
+// Every truncation is refused; every byte set to a few values gives an
+// exception or a value that agrees with itself; never an overrun (ASan watches).
+TEST(IvbUnpacker, TruncatedAndDamagedBlobsAndModelsFailCleanly) {
+    const Bytes blobBytes = ivbgolden::byteBlob(), modelBytes = ivbgolden::faceModel();
+    for (std::size_t n = 0; n < blobBytes.size(); ++n)
+        EXPECT_THROW(DataBlob().fromIvb(Bytes(blobBytes.begin(), blobBytes.begin() + n)), qv_ivb_conversion_error) << n;
+    for (uint8_t v : {0x00, 0x01, 0x10, 0x7F, 0x80, 0xFF}) {
+        for (std::size_t i = 0; i < blobBytes.size(); ++i) {
             DataBlob blob;
             try {
-                blob.fromIvb(damaged);
+                blob.fromIvb(withByte(blobBytes, i, v));
                 EXPECT_EQ(blob.getDataProperty().byteSize(), 2u) << i;
             } catch (const std::exception&) {
             }
+        }
+        for (std::size_t i = 0; i < modelBytes.size(); ++i) {
+            FaceModelData model;
+            try {
+                model.fromIvb(withByte(modelBytes, i, v));
+            } catch (const std::exception&) {
+            }
+            EXPECT_EQ(model.projection.size(), model.dimension) << i;
         }
     }
 }
@@ -198,12 +227,35 @@ TEST(IvbUnpacker, CountsThatDisagreeWithTheDataAreRefusedBeforeAllocating) {
         return packer.data();
     };
     DataBlob blob;
-    // 2^32-1 cubed floats claimed: refused before any allocation.
     EXPECT_THROW(blob.fromIvb(blobWith(DataProperty(DataProperty::FLOAT32, 0xFFFFFFFFu, 0xFFFFFFFFu, 0xFFFFFFFFu))),
                  qv_ivb_conversion_error);
     EXPECT_EQ(blob.bytePointer(), nullptr);
     // More bytes stored than the property says: would overrun the buffer.
     EXPECT_THROW(blob.fromIvb(blobWith(DataProperty(DataProperty::BYTES, 1, 1, 1))), qv_ivb_conversion_error);
+
+    // Face models with a damaged dimension (at 36) or projection size (at 96)
+    // keep their value when refused.
+    const Bytes good = ivbgolden::faceModel();
+    auto withDimension = [&](uint32_t d) {
+        Bytes b = good;
+        for (int i = 0; i < 4; ++i) b[36 + i] = static_cast<uint8_t>(d >> (8 * i));
+        return b;
+    };
+    const std::vector<std::pair<const char*, Bytes>> models = {
+        {"dimension above the stored floats", withDimension(3)},
+        {"dimension below the stored floats", withDimension(1)},
+        {"negative dimension", withDimension(0xFFFFFFFEu)},
+        {"2^31 - 1 floats claimed", withDimension(0x7FFFFFFFu)},
+        {"dimension as float", withByte(good, 29, 0x0C)},
+        {"projection size broken", withByte(good, 96, 0x19)},
+        {"truncated", Bytes(good.begin(), good.end() - 1)},
+    };
+    for (const auto& c : models) {
+        FaceModelData data;
+        data.fromIvb(good);
+        EXPECT_THROW(data.fromIvb(c.second), std::exception) << c.first;
+        EXPECT_EQ(data.toIvb(), good) << c.first;
+    }
 }
 
 TEST(IvbUnpacker, DeepNestingIsIndexedFlatAndRefusedByTheReader) {
@@ -213,43 +265,30 @@ TEST(IvbUnpacker, DeepNestingIsIndexedFlatAndRefusedByTheReader) {
     const uint64_t total = depth * 20 + 16;
     Bytes nested(total, 0);
     for (std::size_t level = 0; level <= depth; ++level) {
-        uint8_t* at = nested.data() + level * 20;
-        ivb::putObjectHeader(at, total - level * 20, ivb::kComposite, 0);
-        if (level < depth) ivb::putU16(at + 18, 40);
+        ivb::putObjectHeader(nested.data() + level * 20, total - level * 20, ivb::kComposite, 0);
+        if (level < depth) ivb::putU16(nested.data() + level * 20 + 18, 40);
     }
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(nested);
     EXPECT_EQ(unpacker.objects().size(), 1u);
-    DataBlob blob;
-    EXPECT_THROW(blob.fromIvb(nested), std::exception);
-    DataProperty property;
-    EXPECT_THROW(property.fromIvb(nested), qv_data_error);
+    EXPECT_THROW(DataBlob().fromIvb(nested), std::exception);
+    EXPECT_THROW(DataProperty().fromIvb(nested), qv_data_error);
 }
 
-TEST(IvbDataProperty, RangeIsStoredOnlyForUnsignedTypes) {
-    struct Case {
-        DataProperty::DataType type;
-        unsigned subType;
-        bool range;
-    };
-    for (const Case& c : {Case{DataProperty::BYTES, 4, false}, Case{DataProperty::UINT32, 8, true},
-                          Case{DataProperty::FLOAT32, 12, false}, Case{DataProperty::UINT64, 10, true},
-                          Case{DataProperty::FLOAT64, 13, false}, Case{DataProperty::NONE, 0, false}}) {
-        SCOPED_TRACE(c.subType);
-        DataProperty p(c.type, 3, 4, 5);
-        EXPECT_EQ(p.ivbSubType().value(), c.subType);
-        p.setMinValue(11);
-        p.setMaxValue(22);
-        DataProperty back;
-        back.setMaxValue(6);
-        back.fromIvb(p.toIvb());
-        EXPECT_EQ(back.dataType(), c.type);
-        EXPECT_EQ(back.maxVal(), c.range ? 22u : 6u);
-    }
-}
-
-TEST(IvbSubType, StorageSizes) {
-    const unsigned expected[] = {0, 1, 1, 1, 1, 1, 2, 2, 4, 4, 8, 8, 4, 8};
-    for (unsigned i = 0; i < 14; ++i) EXPECT_EQ(storageSize(QVIVBObjectSubType(i)), expected[i]) << i;
-    expectThrowWith<std::invalid_argument>([] { storageSize(QVIVBObjectSubType(14)); }, "Invalid IVB sub type");
+TEST(IvbFaceHandles, DamagedRepresentationsAndHandlesWithoutValueRaise) {
+    for (const Bytes& bad : {Bytes(), ivbgolden::emptyComposite(), ivbgolden::compositeWithFloats(),
+                             withByte(ivbgolden::byteBlob(), 0, 0xB0)})
+        expectThrowWith<ApiError>([&] { QVFaceRepresentation().fromIvb(bad); },
+                                  "QVFaceRepresentation could not be read from IVB");
+    QVFaceRepresentation source;
+    source.fromIvb(ivbgolden::byteBlob());
+    failNoThrowNew = true;
+    QVFaceRepresentation broken(source);
+    failNoThrowNew = false;
+    const std::string message = "QVFaceRepresentation not initialized properly";
+    expectThrowWith<ApiError>([&] { broken.name(); }, message);
+    expectThrowWith<ApiError>([&] { broken.fromIvb(ivbgolden::byteBlob()); }, message);
+    expectThrowWith<ApiError>([&] { source = broken; }, message);
+    expectThrowWith<ApiError>([&] { broken = source; }, message);
+    EXPECT_EQ(QVFaceRepresentation(broken).name(), "") << "a copy of it is a fresh, empty value";
 }

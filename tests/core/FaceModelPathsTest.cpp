@@ -8,6 +8,7 @@
 #include "core/FaceModelPathsHandle.h"
 #include "core/Json.h"
 #include "core/ScrambledTexts.h"
+#include "support/ExpectThrow.h"
 #include "support/SourceTree.h"
 
 extern const std::string g_defaultConfigurationText;
@@ -24,7 +25,6 @@ std::string writeConfig(const std::string& name, const std::string& text) {
 
 TEST(DefaultConfiguration, IsTheJsonSourceStoredIllegibly) {
     std::string source = sourcetree::readText(sourcetree::path("models/config/default.json"));
-    ASSERT_FALSE(source.empty());
     EXPECT_EQ(g_defaultConfigurationText.size(), source.size());
     EXPECT_EQ(g_defaultConfigurationText.find("detection"), std::string::npos);
     FaceModelPaths fromSource;
@@ -56,13 +56,8 @@ TEST(FaceModelPathsFile, TrimsBlanksButNotCarriageReturnAndEveryFailureIsOneApiE
         writeConfig("crlf.json", body + "\r\n"), writeConfig("empty.json", ""), writeConfig("array.json", "[1]"),
         writeConfig("cut.json", "{\"detection\":{"), "/nonexistent/dir/config.json",
         sourcetree::scratchDir("face_model_paths_dir")};  // a directory
-    for (const std::string& path : failing) {
-        try {
-            FaceModelPaths paths(path.c_str());
-            ADD_FAILURE() << "loaded " << path;
-        } catch (const ApiError& e) {
-            EXPECT_EQ(std::string(e.what()), descrambleText(scrambled::kConfigurationLoadFailed)) << path;
-        }
-    }
+    for (const std::string& path : failing)
+        expectThrowWith<ApiError>([&] { FaceModelPaths paths(path.c_str()); },
+                                  descrambleText(scrambled::kConfigurationLoadFailed), path);
     EXPECT_THROW(FaceModelPathsHandle(failing[3].c_str()), ApiError);
 }

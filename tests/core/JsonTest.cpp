@@ -3,31 +3,19 @@
 #include <random>
 
 #include "core/Json.h"
+#include "support/ExpectThrow.h"
 
 namespace {
 
 typedef std::map<std::string, std::string> Items;
 typedef std::vector<std::string> List;
 
-struct Record {
-    int a = 0;
-    bool failWrite = false;
-    std::string toJson() const {
-        if (failWrite) throw std::runtime_error("inner text");
-        return "{" + jsonNamedValue("a", a) + "}";
-    }
-    void fromJson(const std::string& text) { jsonObjectItemToNamedValue(parseJsonObject(text), "a", a); }
+// A record whose text cannot be written.
+struct Unwritable {
+    std::string toJson() const { throw std::runtime_error("inner text"); }
 };
 
-template <typename F>
-void expectJsonError(F f, const char* message, const std::string& context) {
-    try {
-        f();
-        ADD_FAILURE() << "accepted: " << context;
-    } catch (const JsonError& e) {
-        EXPECT_STREQ(e.what(), message) << context;
-    }
-}
+const char* const kReadError = "Json deserialization error";
 
 }  // namespace
 
@@ -59,7 +47,7 @@ TEST(JsonObject, RejectsWithTheDeserializationMessage) {
           "{\"a\":\"x\" \"b\":1}", "{\"a\":\"b\\\"c\"}", "{\"a\":{\"b\":\"}\"}}", "{\"a\":[\"]\",{\"b\":1}]}",
           "{a:1}", "{\"a:1}", "{\"\":1}", "{\"a\" 1}", "{\"a\"}", "{\"a\":}", "{\"a\":  }", "{\"a\":\"x}",
           "{\"a\":{\"b\":1}", "{\"a\":[1}", "{\"a\":[1] x}", "{,}", "{\"a\":1,,\"b\":2}"})
-        expectJsonError([&] { parseJsonObject(text); }, "Json deserialization error", text);
+        expectThrowWith<JsonError>([&] { parseJsonObject(text); }, kReadError, text);
 }
 
 TEST(JsonArray, ItemsKeepTheirRawTextInOrder) {
@@ -67,53 +55,32 @@ TEST(JsonArray, ItemsKeepTheirRawTextInOrder) {
     EXPECT_EQ(parseJsonArray("[ 1 , 2 ,]"), (List{"1", "2"}));
     EXPECT_TRUE(parseJsonArray("[ ]").empty());
     for (const char* text : {"", "[", "{}", " []", "[\"x]", "[[1]", "[\"a\" 1]", "[{]"})
-        expectJsonError([&] { parseJsonArray(text); }, "Json deserialization error", text);
+        expectThrowWith<JsonError>([&] { parseJsonArray(text); }, kReadError, text);
 }
 
 TEST(JsonValues, NumbersFollowTheStreamsAndStringsNeedQuotes) {
     EXPECT_EQ(JsonValue<float>::toText(0.1234567f), "0.123457");
     EXPECT_EQ(JsonValue<float>::toText(1234567.0f), "1.23457e+06");
-    EXPECT_EQ(JsonValue<int>::toText(-2147483647 - 1), "-2147483648");
     int i = 7;
     JsonValue<int>::fromText("12abc", i);  // what follows the number is not looked at
     EXPECT_EQ(i, 12);
-    float f = 0;
-    JsonValue<float>::fromText("2.5e1x", f);
-    EXPECT_FLOAT_EQ(f, 25.0f);
     EXPECT_NO_THROW(JsonValue<int>::fromText("abc", i));
-    EXPECT_NO_THROW(JsonValue<float>::fromText("", f));
-
-    std::string s;
-    JsonValue<std::string>::fromText("\"a\\\"b\"", s);  // no unescaping either way
-    EXPECT_EQ(s, "a\\\"b");
-    EXPECT_EQ(JsonValue<std::string>::toText("a\"b"), "\"a\"b\"");
+    EXPECT_EQ(JsonValue<std::string>::toText("a\"b"), "\"a\"b\"");  // no escaping
+    std::string s = "keep";
     for (const char* text : {"", "\"", "x", "\"x", "x\""}) {
-        s = "keep";
         EXPECT_THROW(JsonValue<std::string>::fromText(text, s), JsonError) << text;
         EXPECT_EQ(s, "keep");
     }
 }
 
-TEST(JsonObjectItem, WrittenPairsReadBackAndAbsentKeysKeepDefaults) {
-    Record r;
-    r.a = -17;
-    const std::string text = "{" + jsonNamedValue("n", 3) + "," + jsonNamedValue("f", 3.14159274f) + "," +
-                             jsonNamedValue("s", "x") + "," + jsonNamedValue("b", false) + "," + jsonNamedValue("r", r) +
-                             ",\"x\":yes}";
-    EXPECT_EQ(text, "{\"n\":3,\"f\":3.14159,\"s\":\"x\",\"b\":false,\"r\":{\"a\":-17},\"x\":yes}");
-    const Items m = parseJsonObject(text);
-    Record out;
-    int missing = 2;
-    bool b = true, x = false;
-    EXPECT_TRUE(jsonObjectItemToNamedValue(m, "r", out));
-    EXPECT_TRUE(jsonObjectItemToNamedValue(m, "b", b));
-    EXPECT_FALSE(jsonObjectItemToNamedValue(m, "missing", missing));
-    EXPECT_EQ(out.a, -17);
-    EXPECT_FALSE(b);
-    EXPECT_EQ(missing, 2);
-    EXPECT_THROW(jsonObjectItemToNamedValue(m, "x", x), JsonError);
-    r.failWrite = true;
-    expectJsonError([&] { jsonNamedValue("r", r); }, "Json serialization error", "failing record");
+// The record tests write and read every other kind of value.
+TEST(JsonObjectItem, BooleansAreWordsAndInnerFailuresBecomeJsonErrors) {
+    bool b = false;
+    EXPECT_TRUE(jsonObjectItemToNamedValue(parseJsonObject("{" + jsonNamedValue("b", true) + "}"), "b", b));
+    EXPECT_TRUE(b);
+    for (const char* text : {"{\"b\":yes}", "{\"b\":1}", "{\"b\":\"true\"}"})
+        EXPECT_THROW(jsonObjectItemToNamedValue(parseJsonObject(text), "b", b), JsonError) << text;
+    expectThrowWith<JsonError>([] { jsonNamedValue("r", Unwritable()); }, "Json serialization error");
 }
 
 // Every prefix of a valid text, and random texts over the dialect's own

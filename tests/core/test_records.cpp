@@ -2,8 +2,6 @@
 
 #include <climits>
 #include <stdexcept>
-#include <string>
-#include <vector>
 
 #include "core/ApiError.h"
 #include "core/FaceData.h"
@@ -11,35 +9,22 @@
 #include "core/FaceRecord.h"
 #include "core/Json.h"
 #include "core/QVFace.h"
-#include "core/RecordTexts.h"
+#include "support/ExpectThrow.h"
 
 namespace {
 
-template <typename F>
-std::string jsonErrorOf(F f) {
-    try {
-        f();
-    } catch (const JsonError& e) {
-        return e.what();
-    }
-    return "<no JsonError>";
-}
+const char* const kReadError = "Json deserialization error";
+
+// Every field set, as toJson writes it: floats keep six significant digits.
+const std::string kFullFace =
+    R"({"dataSet":"set", "filePath":"dir/img 1.pgm", "faceRect":[-5,20,110,120], "faceScore":0.123457, )"
+    R"("landmarks":{"leftEye":[30.5,40.25],"nose":[1e-07,-2.5e+06]}, "goodFace":false, "personID":-1, )"
+    R"("personName":"Ann", "age":33.3333, "ageInterval":"ageInterval4", "race":"race0", "gender":"gender1", )"
+    R"("facePose":"pose6"})";
 
 FaceData fullFace() {
     FaceData f;
-    f.setDataSet("set");
-    f.setFilePath("dir/img 1.pgm");
-    f.setFaceRect(Rect2<int32_t>(-5, 20, 110, 120));
-    f.setFaceScore(0.123456789f);
-    f.setLandmark("leftEye", Point2<float>(30.5f, 40.25f));
-    f.setLandmark("nose", Point2<float>(1e-7f, -2.5e6f));
-    f.setGoodFace(false);
-    f.setPersonName("Ann");
-    f.setAge(33.3333333f);
-    f.setAgeInterval(FaceAgeInterval(4));
-    f.setRace(FaceRace(0));
-    f.setGender(FaceGender(1));
-    f.setFacePose(FacePose(6));
+    f.fromJson(kFullFace);
     return f;
 }
 
@@ -50,28 +35,15 @@ TEST(RecordFaceDataText, DefaultRecordTextAndRoundTrips) {
               "\"landmarks\":{}, \"goodFace\":true, \"personID\":-1, \"personName\":\"\", \"age\":-1, "
               "\"ageInterval\":\"ageIntervalNone\", \"race\":\"raceNone\", \"gender\":\"genderNone\", "
               "\"facePose\":\"poseNone\"}");
-    for (const FaceData& original : {FaceData(), fullFace()}) {
-        FaceData back;
-        back.setFaceScore(7.0f);
-        back.fromJson(original.toJson());
-        EXPECT_EQ(back.toJson(), original.toJson());
-    }
-    FaceData back;  // floats keep six significant digits
-    back.fromJson(fullFace().toJson());
-    EXPECT_EQ(back.faceScore(), 0.123457f);
-    EXPECT_EQ(back.landmark("nose"), Point2<float>(1e-7f, -2.5e6f));
-    EXPECT_EQ(back.facePose().value, 6);
+    EXPECT_EQ(fullFace().toJson(), kFullFace);
 }
 
 TEST(RecordFaceDataText, AbsentKeysKeepValuesAndUnknownKeysAreIgnored) {
     FaceData f = fullFace();
-    const std::string before = f.toJson();
     f.fromJson("{}");
-    EXPECT_EQ(f.toJson(), before);
-    f.fromJson(R"({"personName":"Bo", "unknown":[1,2,{"x":3}], "faceScore":2, "personID":42})");
-    EXPECT_EQ(f.personName(), "Bo");
-    EXPECT_EQ(f.faceScore(), 2.0f);
-    EXPECT_EQ(f.dataSet(), "set");
+    EXPECT_EQ(f.toJson(), kFullFace);
+    f.fromJson(R"({"personName":"Bo", "unknown":[1,2,{"x":3}], "personID":42})");
+    EXPECT_EQ(f.dataSet() + f.personName(), "setBo");
     EXPECT_NE(f.toJson().find("\"personID\":42"), std::string::npos) << "no accessor, but it travels";
     f.fromJson(R"({"faceRect":[12abc,2,3,4], "age":old})");  // unreadable numbers are no error
     EXPECT_EQ(f.faceRect().left, 12);
@@ -83,10 +55,8 @@ TEST(RecordFaceDataText, MalformedFieldsAreRejectedAfterEarlierFieldsWereTaken) 
     for (const char* text : {R"({"faceRect":[1,2,3]})", R"({"faceRect":[1,2,3,4,5]})", R"({"goodFace":1})",
                              R"({"goodFace":"true"})", R"({"landmarks":{"a":[1]}})", R"({"landmarks":[1,2]})",
                              R"({"gender":"gender2"})", R"({"facePose":poseNone})", R"({"race":3})",
-                             R"({"dataSet":set})", "{\"faceRect\":[1,2,3,4]", "", "{\"a\":\"open}"}) {
-        FaceData f;
-        EXPECT_EQ(jsonErrorOf([&] { f.fromJson(text); }), "Json deserialization error") << text;
-    }
+                             R"({"dataSet":set})", "{\"faceRect\":[1,2,3,4]", "", "{\"a\":\"open}"})
+        expectThrowWith<JsonError>([&] { FaceData().fromJson(text); }, kReadError, text);
     FaceData f;
     EXPECT_THROW(f.fromJson(R"({"dataSet":"kept", "faceRect":[1,2], "personName":"never"})"), JsonError);
     EXPECT_EQ(f.dataSet() + f.personName(), "kept");
@@ -102,11 +72,11 @@ void expectLabelsRoundTrip(int lowest, int highest) {
         EXPECT_EQ(back.value, v);
     }
     for (int v : {lowest - 1, highest + 1, INT_MAX, INT_MIN})
-        EXPECT_EQ(jsonErrorOf([&] { E(v).toJson(); }), "Json serialization error") << v;
+        expectThrowWith<JsonError>([&] { E(v).toJson(); }, "Json serialization error", std::to_string(v));
     E e(0);
     const std::string label = E(1).toJson();
     for (const std::string& text : {label.substr(1, label.size() - 2), label + " ", std::string("\"\"")})
-        EXPECT_EQ(jsonErrorOf([&] { e.fromJson(text); }), "Json deserialization error") << text;
+        expectThrowWith<JsonError>([&] { e.fromJson(text); }, kReadError, text);
     EXPECT_EQ(e.value, 0) << "a rejected text leaves the value";
 }
 
@@ -123,12 +93,12 @@ TEST(RecordEnumerations, PoseMirrorsAndWildness) {
         EXPECT_EQ(FacePose(v).flip().value, mirror[v + 1]);
         EXPECT_EQ(FacePose(v).wildPose(), v < 0 || v > 2) << v;
     }
-    for (int v : {-2, 7, INT_MIN}) EXPECT_EQ(jsonErrorOf([&] { FacePose(v).flip(); }), "Invalid pose");
+    for (int v : {-2, 7, INT_MIN}) expectThrowWith<JsonError>([&] { FacePose(v).flip(); }, "Invalid pose");
 }
 
 TEST(RecordAttributes, FiveNamedFieldsRoundTripAndOthersRaiseApiError) {
     FaceRecord r(fullFace()), other;
-    EXPECT_EQ(r.attribute("attributeAge"), "33.3333321");  // nine digits here, unlike the record text
+    EXPECT_EQ(r.attribute("attributeAge"), "33.3333015");  // nine digits here, unlike the record text
     for (const char* name : {"attributeAge", "attributeGender", "attributeRace", "attributeAgeInterval", "attributePose"}) {
         other.setAttribute(name, r.attribute(name));
         EXPECT_EQ(other.attribute(name), r.attribute(name)) << name;
@@ -144,19 +114,13 @@ TEST(RecordAttributes, FiveNamedFieldsRoundTripAndOthersRaiseApiError) {
 }
 
 TEST(RecordQVFaceHandle, CopiesAreDeepAndFailuresAreReported) {
-    QVFace a;
-    a.fromJson(fullFace().toJson());
-    QVFace b(a);
+    QVFace a, b;
     b.setPersonName("Cy");
-    EXPECT_EQ(a.personName(), "Ann");
     a = b;
-    b.setGoodFace(true);
+    b.setPersonName("Di");
     EXPECT_EQ(a.personName(), "Cy");
-    EXPECT_FALSE(a.isGoodFace());
-    QVFace fresh;
-    EXPECT_THROW(fresh.landmark("nose"), std::invalid_argument);
-    EXPECT_THROW(fresh.fromJson("not json"), ApiError);
-    EXPECT_EQ(fresh.toJson(), FaceData().toJson());
+    EXPECT_THROW(QVFace().landmark("nose"), std::invalid_argument);
+    EXPECT_THROW(QVFace().fromJson("not json"), ApiError);
 }
 
 }  // namespace

@@ -15,9 +15,9 @@
 // so that the test fails on its size.
 namespace fixtures {
 
-inline std::vector<double> values(const std::string& name) {
-    static const std::map<std::string, std::vector<double>> table = [] {
-        std::map<std::string, std::vector<double>> t;
+inline std::vector<float> floats(const std::string& name) {
+    static const std::map<std::string, std::vector<float>> table = [] {
+        std::map<std::string, std::vector<float>> t;
         std::istringstream in(sourcetree::readText(sourcetree::path("tests/numeric/fixtures/numeric_reference.txt")));
         for (std::string line; std::getline(in, line);) {
             if (line.empty() || line[0] == '#') continue;
@@ -25,23 +25,18 @@ inline std::vector<double> values(const std::string& name) {
             std::string key;
             std::size_t count = 0;
             fields >> key >> count;
-            std::vector<double>& v = t[key];
-            for (double x = 0; v.size() < count && fields >> x;) v.push_back(x);
+            std::vector<float>& v = t[key];
+            for (float x = 0; v.size() < count && fields >> x;) v.push_back(x);
         }
         return t;
     }();
     auto it = table.find(name);
-    return it == table.end() ? std::vector<double>() : it->second;
-}
-
-inline std::vector<float> floats(const std::string& name) {
-    const std::vector<double> v = values(name);
-    return std::vector<float>(v.begin(), v.end());
+    return it == table.end() ? std::vector<float>() : it->second;
 }
 
 // Expects `actual` to agree with the reference `name`, element by element.
 inline void expectAgrees(const std::vector<float>& actual, const std::string& name, double tolerance) {
-    const std::vector<double> reference = values(name);
+    const std::vector<float> reference = floats(name);
     ASSERT_EQ(actual.size(), reference.size()) << name;
     for (std::size_t i = 0; i < actual.size(); ++i) EXPECT_NEAR(actual[i], reference[i], tolerance) << name << "[" << i << "]";
 }

@@ -85,13 +85,9 @@ TEST(VectorQuantizer, RoutesThroughTheTreeAndRefusesTreesThatDoNotFit) {
     // carry codes 0..3. Below the threshold goes left, ties go right.
     VectorQuantizer q;
     q.setTree(3, 2, {1, 0, 0, 1, 1, 1}, {0, 0, 10});
-    VectorQuantizer reloaded;
-    reloaded.fromIvb(q.toIvb());
     for (const auto& c : std::vector<std::pair<std::vector<float>, unsigned>>{
-             {{-1, -1}, 0}, {{-1, 0}, 1}, {{-5, 3}, 1}, {{0, 0}, 2}, {{4, 5}, 2}, {{4, 6}, 3}, {{20, -1}, 3}}) {
+             {{-1, -1}, 0}, {{-1, 0}, 1}, {{-5, 3}, 1}, {{0, 0}, 2}, {{4, 5}, 2}, {{4, 6}, 3}, {{20, -1}, 3}})
         EXPECT_EQ(q.quantize(c.first.data()), c.second) << c.first[0] << "," << c.first[1];
-        EXPECT_EQ(reloaded.quantize(c.first.data()), c.second);
-    }
     EXPECT_THROW(q.setTree(3, 2, {1, 0, 0, 1, 1}, {0, 0, 10}), qv_invalid_argument);
     EXPECT_THROW(q.setTree(2, 2, {1, 0, 0, 1}, {0}), qv_invalid_argument);
     EXPECT_THROW(q.setTree(1, 0, {}, {0}), qv_invalid_argument);
