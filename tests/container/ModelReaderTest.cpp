@@ -70,7 +70,7 @@ TEST(ModelReaderBounds, ReadingPastTheEndRaisesAndConsumesNothing) {
     }
 }
 
-TEST(ModelReaderPaths, ModelPathObjectNameAndFailures) {
+TEST(ModelReaderPaths, ModelPathObjectNameModesAndFailures) {
     typedef std::pair<std::string, std::string> P;
     for (const auto& c : std::vector<std::pair<std::string, P>>{
              {"m::", {"m", ""}}, {"::n", {"", "n"}}, {"a/m::b::c", {"a/m", "b::c"}}, {"m:x", {"m:x", ""}}})
@@ -80,9 +80,7 @@ TEST(ModelReaderPaths, ModelPathObjectNameAndFailures) {
     for (const char* path : {"nosuchmodel", "mdcb.bin", "MDCB"})
         expectThrowWith<qv_data_error>([&] { ModelReader r(path, ModelReader::RAW); },
                                        descrambleText(scrambled::kModelNotFound));
-}
-
-TEST(ModelReaderModes, EachModeReadsOnlyItsOwnWay) {
+    // Each mode reads only its own way.
     ScopedModel model("moded", patternPayload(4));
     expectThrowWith<qv_data_error>([&] { ModelReader r("moded", ModelReader::IVB); }, "Not a valid QV IVB file");
     expectThrowWith<std::exception>([&] { ModelReader("moded", ModelReader::RAW).readObject(); },
@@ -107,7 +105,7 @@ TEST(ModelReaderIvb, ServesObjectsByNameOrInOrder) {
 TEST(ModelReaderRaw, BuiltInModelsReadBackAsTheirSources) {
     for (const char* name : {"mdcb", "mdnb", "mdpb"}) {
         ModelReader reader(name, ModelReader::RAW);
-        const std::vector<uint8_t> source = sourcetree::readBytes(sourcetree::path(std::string("models/") + name + ".bin"));
-        EXPECT_EQ(readInChunks(reader, {5, 1, 256}), source) << name;
+        const std::string source = sourcetree::path(std::string("models/") + name + ".bin");
+        EXPECT_EQ(readInChunks(reader, {5, 1, 256}), sourcetree::readBytes(source)) << name;
     }
 }

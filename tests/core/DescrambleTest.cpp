@@ -37,7 +37,7 @@ TEST(ScrambledTextTables, HeadersMatchTheirTablesAndRestore) {
     std::map<std::string, std::string> plain;
     for (std::string line; std::getline(table, line);) {
         const std::size_t tab = line.find('\t');
-        if (!line.empty() && line[0] != '#' && tab != std::string::npos) plain[line.substr(0, tab)] = line.substr(tab + 1);
+        if (line[0] != '#' && tab != std::string::npos) plain[line.substr(0, tab)] = line.substr(tab + 1);
     }
     EXPECT_EQ(descrambleText(scrambled::kModelNotFound), plain["kModelNotFound"]);
     EXPECT_EQ(descrambleText(scrambled::kConfigurationLoadFailed), plain["kConfigurationLoadFailed"]);

@@ -58,9 +58,7 @@ TEST(JsonArray, ItemsKeepTheirRawTextInOrder) {
         expectThrowWith<JsonError>([&] { parseJsonArray(text); }, kReadError, text);
 }
 
-TEST(JsonValues, NumbersFollowTheStreamsAndStringsNeedQuotes) {
-    EXPECT_EQ(JsonValue<float>::toText(0.1234567f), "0.123457");
-    EXPECT_EQ(JsonValue<float>::toText(1234567.0f), "1.23457e+06");
+TEST(JsonValues, NumbersIgnoreWhatFollowsAndStringsNeedQuotes) {
     int i = 7;
     JsonValue<int>::fromText("12abc", i);  // what follows the number is not looked at
     EXPECT_EQ(i, 12);
@@ -76,8 +74,6 @@ TEST(JsonValues, NumbersFollowTheStreamsAndStringsNeedQuotes) {
 // The record tests write and read every other kind of value.
 TEST(JsonObjectItem, BooleansAreWordsAndInnerFailuresBecomeJsonErrors) {
     bool b = false;
-    EXPECT_TRUE(jsonObjectItemToNamedValue(parseJsonObject("{" + jsonNamedValue("b", true) + "}"), "b", b));
-    EXPECT_TRUE(b);
     for (const char* text : {"{\"b\":yes}", "{\"b\":1}", "{\"b\":\"true\"}"})
         EXPECT_THROW(jsonObjectItemToNamedValue(parseJsonObject(text), "b", b), JsonError) << text;
     expectThrowWith<JsonError>([] { jsonNamedValue("r", Unwritable()); }, "Json serialization error");
@@ -103,10 +99,7 @@ TEST(JsonRobustness, TruncatedAndGarbageTextsFailCleanly) {
         std::string t;
         for (int i = static_cast<int>(rng() % 24); i > 0; --i) t += alphabet[rng() % alphabet.size()];
         t = (round % 2 ? "{" : "[") + t + (round % 2 ? "}" : "]");
-        const std::size_t p = rng() % (t.size() + 2);
         tolerate([&] { parseJsonObject(t); });
         tolerate([&] { parseJsonArray(t); });
-        tolerate([&] { findPairedChar(t, p, '}'); });
-        tolerate([&] { moveToNextToken(t, p); });
     }
 }

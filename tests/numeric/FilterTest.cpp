@@ -36,21 +36,14 @@ std::vector<float> filtered(Filter1D& f, const std::vector<float>& signal) {
 
 }  // namespace
 
-TEST(FilterKernel1D, ConvolvesWithReplicatedBordersAndStrides) {
-    // anchor 0, {1, 2}: out[i] = data[i] + 2 * data[i - 1], data[-1] read as data[0].
-    const std::vector<float> data = {1, 10, 100, 1000};
-    std::vector<float> out(4);
-    kernelOf(0, {1, 2}).filter(data.data(), 4, 1, 1, out.data());
-    EXPECT_EQ(out, (std::vector<float>{3, 12, 120, 1200}));
-    // Every second sample in, every third float out.
-    const std::vector<float> strided = {1, -9, 10, -9, 100};
-    std::vector<float> spaced(7, -1.0f);
-    kernelOf(1, {1, 1, 1}).filter(strided.data(), 3, 2, 3, spaced.data());
-    EXPECT_EQ(spaced, (std::vector<float>{12, -1, -1, 111, -1, -1, 210}));
-    // Nothing read or written for an empty signal; an empty kernel yields 0.
+// Borders and strides are checked against the references below; what they
+// cannot show: nothing is read or written for an empty signal, and an empty
+// kernel yields 0.
+TEST(FilterKernel1D, EmptySignalsAndKernels) {
     float untouched = 5.0f;
     kernelOf(0, {1}).filter(nullptr, 0, 1, 1, &untouched);
     EXPECT_EQ(untouched, 5.0f);
+    const std::vector<float> data = {1, 10, 100, 1000};
     QVFilterKernel1D().filterAt(data.data(), 4, 1, 2, &untouched);
     EXPECT_EQ(untouched, 0.0f);
 }
@@ -71,9 +64,7 @@ TEST(GaussianFilter1D, KernelsAndOutputsMatchTheReferences) {
             EXPECT_NEAR(at, out[i], 1e-6);
         }
     }
-    // A constant signal stays constant; sigmas below 1/3 give the identity.
-    GaussianFilter1D wide(2.2f), narrow(0.3f);
-    for (float v : filtered(wide, std::vector<float>(50, 3.25f))) EXPECT_NEAR(v, 3.25f, 1e-5);
+    GaussianFilter1D narrow(0.3f);  // below 1/3 the kernel is {1}
     EXPECT_EQ(filtered(narrow, signal), signal);
 }
 
@@ -141,7 +132,8 @@ TEST(Filters, BadSigmasAndParametersFailWithoutTouchingMemory) {
     EXPECT_EQ(GaussianFilter1D(-0.0f).radius(), 0);  // floor(3 * -0) is not negative
     // The factories give null instead.
     for (const char* description : {"{\"name\":\"QV_FILTER1D_GAUSSIAN\",\"param\":{\"sigma\":-1}}",
-                                    "{\"name\":\"QV_FILTER1D_GAUSSIAN\",\"param\":[1]}", "{\"name\":\"QV_FILTER1D_DOG\"}"}) {
+                                    "{\"name\":\"QV_FILTER1D_GAUSSIAN\",\"param\":[1]}",
+                                    "{\"name\":\"QV_FILTER1D_DOG\"}"}) {
         EXPECT_EQ(std::unique_ptr<Filter1D>(Filter1DFactory::instance().createInstance(description)), nullptr);
         EXPECT_EQ(std::unique_ptr<Filter2D>(Filter2DFactory::instance().createInstance(description)), nullptr);
     }

@@ -20,13 +20,11 @@ inline std::vector<float> floats(const std::string& name) {
         std::map<std::string, std::vector<float>> t;
         std::istringstream in(sourcetree::readText(sourcetree::path("tests/numeric/fixtures/numeric_reference.txt")));
         for (std::string line; std::getline(in, line);) {
-            if (line.empty() || line[0] == '#') continue;
             std::istringstream fields(line);
             std::string key;
             std::size_t count = 0;
-            fields >> key >> count;
-            std::vector<float>& v = t[key];
-            for (float x = 0; v.size() < count && fields >> x;) v.push_back(x);
+            if (!(fields >> key >> count)) continue;  // blank or comment
+            for (float x = 0; t[key].size() < count && fields >> x;) t[key].push_back(x);
         }
         return t;
     }();
@@ -38,7 +36,8 @@ inline std::vector<float> floats(const std::string& name) {
 inline void expectAgrees(const std::vector<float>& actual, const std::string& name, double tolerance) {
     const std::vector<float> reference = floats(name);
     ASSERT_EQ(actual.size(), reference.size()) << name;
-    for (std::size_t i = 0; i < actual.size(); ++i) EXPECT_NEAR(actual[i], reference[i], tolerance) << name << "[" << i << "]";
+    for (std::size_t i = 0; i < actual.size(); ++i)
+        EXPECT_NEAR(actual[i], reference[i], tolerance) << name << "[" << i << "]";
 }
 
 }  // namespace fixtures

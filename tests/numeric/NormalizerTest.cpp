@@ -23,25 +23,27 @@ std::vector<float> run(const QVNormalizer& n, std::vector<float> v) {
 }  // namespace
 
 TEST(Normalizers, MatchNumpyInPlaceOrNot) {
-    const std::vector<std::pair<std::string, std::string>> cases = {
-        {"{\"name\":\"QV_NORMALIZER_L1\",\"param\":{}}", "norm_l1_mixed"},
-        {"{\"name\":\"QV_NORMALIZER_L2\",\"param\":{}}", "norm_l2_mixed"},
-        {"{\"name\":\"QV_NORMALIZER_L1SQRT\",\"param\":{}}", "norm_l1sqrt_hist"},
-        {"{\"name\":\"QV_NORMALIZER_L2HYS\",\"param\":{\"clipThreshold\":0.2,\"alpha\":0.01}}",
-         "norm_l2hys_mixed_0_2_0_01"},
+    struct Case {
+        std::string name, param, input, reference;
     };
-    for (const auto& c : cases) {
-        SCOPED_TRACE(c.second);
-        std::unique_ptr<QVNormalizer> n(QVNormalizerFactory::instance().createInstance(c.first));
+    for (const Case& c : {Case{"QV_NORMALIZER_L1", "{}", "norm_mixed", "norm_l1_mixed"},
+                          Case{"QV_NORMALIZER_L2", "{}", "norm_mixed", "norm_l2_mixed"},
+                          Case{"QV_NORMALIZER_L1SQRT", "{}", "norm_hist", "norm_l1sqrt_hist"},
+                          Case{"QV_NORMALIZER_L2HYS", "{\"clipThreshold\":0.2,\"alpha\":0.01}", "norm_mixed",
+                               "norm_l2hys_mixed_0_2_0_01"}}) {
+        SCOPED_TRACE(c.reference);
+        std::unique_ptr<QVNormalizer> n(
+            QVNormalizerFactory::instance().createInstance("{\"name\":\"" + c.name + "\",\"param\":" + c.param + "}"));
         ASSERT_NE(n, nullptr);
-        const std::vector<float> input = fixtures::floats(c.second.find("hist") != std::string::npos ? "norm_hist" : "norm_mixed");
+        const std::vector<float> input = fixtures::floats(c.input);
         const std::vector<float> out = run(*n, input);
-        fixtures::expectAgrees(out, c.second, 1e-6);
+        fixtures::expectAgrees(out, c.reference, 1e-6);
         std::vector<float> inPlace = input;
         n->normalize(inPlace.data(), static_cast<unsigned int>(inPlace.size()), inPlace.data());
         EXPECT_EQ(inPlace, out);
     }
-    for (const char* bad : {"{\"name\":\"QV_NORMALIZER_L1\",\"param\":{\"x\":1}}", "{\"name\":\"QV_NORMALIZER_L1SQRT\"}"})
+    for (const char* bad :
+         {"{\"name\":\"QV_NORMALIZER_L1\",\"param\":{\"x\":1}}", "{\"name\":\"QV_NORMALIZER_L1SQRT\"}"})
         EXPECT_EQ(std::unique_ptr<QVNormalizer>(QVNormalizerFactory::instance().createInstance(bad)), nullptr) << bad;
 }
 

@@ -6,6 +6,7 @@
 
 #include <cstring>
 
+#include "container/IvbBytes.h"
 #include "core/Errors.h"
 #include "numeric/Fixtures.h"
 #include "quorin/ProjectionTransforms.h"
@@ -65,12 +66,9 @@ constexpr uint8_t kF = 12, kU = 8, kI = 9, kC = 3, kUC = 4;
 Bytes composite(const std::vector<Member>& members) {
     QVIVBCompositeObjectPacker packer;
     for (const Member& m : members) {
-        Bytes object(16, 0);
-        const uint64_t size = 16 + m.elements.size();
-        for (int i = 0; i < 8; ++i) object[static_cast<size_t>(i)] = static_cast<uint8_t>(size >> (8 * i));
-        object[8] = 1;
-        object[9] = m.subType;
-        object.insert(object.end(), m.elements.begin(), m.elements.end());
+        Bytes object(16 + m.elements.size());
+        ivb::putObjectHeader(object.data(), object.size(), ivb::kBasic, m.subType);
+        std::copy(m.elements.begin(), m.elements.end(), object.begin() + 16);
         packer.appendObjInfo(std::string(), m.tag);
         packer.appendObj(object);
     }
@@ -162,16 +160,17 @@ TEST(NumericIvb, DamagedMembersGetTheirErrors) {
         {"thresholds missing", 0, {{96, kU, one}, {64, kU, two}, {97, kF, w}}, kMissing},
         {"innerNodeNum stored as int", 0, {{96, kI, one}, {64, kU, two}, {97, kF, w}, {98, kF, t}}, kConversion},
         {"weights of sub type 0", 0, {{96, kU, one}, {64, kU, two}, {97, 0, w}, {98, kF, t}}, kConversion},
-        {"heap indices beyond int", 0, {{96, kU, raw<uint32_t>({0x3FFFFFFF})}, {64, kU, zero}, {97, kF, {}}, {98, kF, t}},
-         kConversion},
+        {"heap indices beyond int", 0,
+         {{96, kU, raw<uint32_t>({0x3FFFFFFF})}, {64, kU, zero}, {97, kF, {}}, {98, kF, t}}, kConversion},
         {"many rows of dimension 0", 1,
          {{64, kU, zero}, {192, kU, raw<uint32_t>({0xFFFFFFFF})}, {193, kF, {}}, {194, kC, metric}}, kConversion},
         {"counts whose product wraps 32 bits", 1,
          {{64, kU, raw<uint32_t>({0x10000})}, {192, kU, raw<uint32_t>({0x10000})}, {193, kF, {}}, {194, kC, metric}},
          kConversion},
-        {"metric as unsigned char", 1, {{64, kU, two}, {192, kU, two}, {193, kF, rows}, {194, kUC, metric}}, kConversion},
-        {"outputs from no input", 2, {{64, kU, zero}, {128, kU, raw<uint32_t>({0x40000000})}, {129, kF, {}}, {130, kF, {}}},
+        {"metric as unsigned char", 1, {{64, kU, two}, {192, kU, two}, {193, kF, rows}, {194, kUC, metric}},
          kConversion},
+        {"outputs from no input", 2,
+         {{64, kU, zero}, {128, kU, raw<uint32_t>({0x40000000})}, {129, kF, {}}, {130, kF, {}}}, kConversion},
         {"mean longer than rawDim", 2, {{64, kU, one}, {128, kU, one}, {129, kF, w}, {130, kF, t}}, kConversion},
         {"pcaDim missing", 2, {{64, kU, one}, {129, kF, t}, {130, kF, t}}, kMissing},
     };

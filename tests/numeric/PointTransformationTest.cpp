@@ -23,7 +23,8 @@ TEST(PointTransformations, TranslateScaleAndSimilarityRecoverTheirMaps) {
     const auto t = QVTranslateScaleTransformation::calc({{P(1, 2), P(0, 0)}, {P(3, 5), P(1, 1)}});
     EXPECT_EQ(t.transform(P(10, -1)), P(21, -1));
     // Equal coordinates on one axis: that axis is not a number, no failure.
-    EXPECT_FALSE(std::isfinite(QVTranslateScaleTransformation::calc({{P(1, 2), P(4, 0)}, {P(3, 5), P(4, 1)}}).scaleX()));
+    const auto flat = QVTranslateScaleTransformation::calc({{P(1, 2), P(4, 0)}, {P(3, 5), P(4, 1)}});
+    EXPECT_FALSE(std::isfinite(flat.scaleX()));
 
     // The applied matrix is (c, n; -n, c): a clockwise turn by `angle` in y-up axes.
     for (float angle : {0.0f, 0.4f, -1.3f, 2.9f}) {
@@ -49,7 +50,7 @@ TEST(PointTransformations, AffineAgreesWithLstsqAndDegenerateSourcesAreNotANumbe
     ASSERT_EQ(source.size(), 24u);
     ASSERT_EQ(target.size(), 24u);
     PointPairs pairs;
-    for (std::size_t i = 0; i < 12; ++i) pairs.push_back({P(target[2 * i], target[2 * i + 1]), P(source[2 * i], source[2 * i + 1])});
+    for (std::size_t i = 0; i < 24; i += 2) pairs.push_back({P(target[i], target[i + 1]), P(source[i], source[i + 1])});
     const AffineTransformation t = AffineTransformation::calc(pairs);
     std::vector<float> mapped;
     for (std::size_t i = 0; i + 1 < probes.size(); i += 2) {
