@@ -72,6 +72,8 @@ TEST(IvbGolden, CompositeLayoutsBothWays) {
     EXPECT_EQ(packer.data(), ivbgolden::compositeWithFloats());
 
     QVIVBCompositeObjectUnpacker unpacker;
+    unpacker.parse(ivbgolden::emptyComposite());
+    EXPECT_TRUE(unpacker.objects().empty());
     unpacker.parse(ivbgolden::compositeWithFloats());
     const uint32_t id = unpacker.getObjId("", 5);
     QVIVBObjectSubType subType;
@@ -95,10 +97,7 @@ TEST(IvbGolden, DataPropertyAndBlobBothWays) {
     blob.init(DataProperty(DataProperty::BYTES, 1, 1, 2));
     blob.bytePointer()[0] = 0xAB;
     blob.bytePointer()[1] = 0xCD;
-    EXPECT_EQ(blob.toIvb(), ivbgolden::byteBlob());
-    DataBlob back;
-    back.fromIvb(ivbgolden::byteBlob());
-    EXPECT_EQ(back.toIvb(), ivbgolden::byteBlob());
+    EXPECT_EQ(blob.toIvb(), ivbgolden::byteBlob());  // read back through QVFaceRepresentation below
 }
 
 TEST(IvbGolden, FaceHandlesBothWaysAndCopiesAreDeep) {

@@ -32,6 +32,7 @@ Bytes writeThreeObjects(const std::string& file, bool tail) {
     return sourcetree::readBytes(file);
 }
 
+// True when walking `bytes` (in order, or searching a name) ends in a clear error.
 bool failsToWalk(const Bytes& bytes, bool byName) {
     try {
         QVIVBMemoryReader reader(bytes.data(), bytes.data() + bytes.size());

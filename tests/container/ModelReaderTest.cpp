@@ -33,7 +33,6 @@ std::vector<uint8_t> readInChunks(ModelReader& reader, const std::vector<unsigne
 }
 
 const char* const kTruncated = "Model data truncated";
-const char* const kNoRaw = "The reader does not support raw mode loading";
 
 }  // namespace
 
@@ -85,7 +84,8 @@ TEST(ModelReaderPaths, ModelPathObjectNameModesAndFailures) {
     expectThrowWith<qv_data_error>([&] { ModelReader r("moded", ModelReader::IVB); }, "Not a valid QV IVB file");
     expectThrowWith<std::exception>([&] { ModelReader("moded", ModelReader::RAW).readObject(); },
                                     "The reader does not support ivb mode loading");
-    expectThrowWith<std::exception>([&] { ModelReader("moded", 5).rawSize(); }, kNoRaw);
+    expectThrowWith<std::exception>([&] { ModelReader("moded", 5).rawSize(); },
+                                    "The reader does not support raw mode loading");
 }
 
 // The IVB stream itself is read by QVIVBMemoryReader (IvbStreamTest).

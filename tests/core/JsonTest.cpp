@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <random>
+#include <stdexcept>
 
 #include "core/Json.h"
 #include "support/ExpectThrow.h"
@@ -8,7 +9,6 @@
 namespace {
 
 typedef std::map<std::string, std::string> Items;
-typedef std::vector<std::string> List;
 
 // A record whose text cannot be written.
 struct Unwritable {
@@ -51,6 +51,7 @@ TEST(JsonObject, RejectsWithTheDeserializationMessage) {
 }
 
 TEST(JsonArray, ItemsKeepTheirRawTextInOrder) {
+    typedef std::vector<std::string> List;
     EXPECT_EQ(parseJsonArray("[\"x\",{\"a\":[1,2]},[3],4.5]"), (List{"\"x\"", "{\"a\":[1,2]}", "[3]", "4.5"}));
     EXPECT_EQ(parseJsonArray("[ 1 , 2 ,]"), (List{"1", "2"}));
     EXPECT_TRUE(parseJsonArray("[ ]").empty());
