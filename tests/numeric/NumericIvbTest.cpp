@@ -22,13 +22,14 @@ const char* const kConversion = "QV IVB object conversion error";
 const char* const kMissing = "Could not find corresponding object id";
 
 // Loads `bytes` into an object holding `golden`: the error text, "" when it
-// loaded. A refused load must leave the object as it was.
+// loaded (and writes `bytes` back). A refused load must leave the object as it was.
 template <typename T>
 std::string loadOverGolden(const Bytes& golden, const Bytes& bytes) {
     T object;
     object.fromIvb(golden);
     try {
         object.fromIvb(bytes);
+        EXPECT_EQ(object.toIvb(), bytes);
         return "";
     } catch (const std::exception& e) {
         EXPECT_EQ(object.toIvb(), golden) << "the object must stay as it was";
