@@ -1,15 +1,33 @@
+// IVB objects: the hand-written byte layouts in both directions, the
+// unpacker's lookup and refusals, and damaged or lying bytes of every object
+// kind stored in this format (blob, face model, representation).
+
 #include <gtest/gtest.h>
 
-#include <cstring>
-#include <functional>
-#include <stdexcept>
+#include <new>
 
-#include "support/ExpectThrow.h"
+#include "container/FaceModelData.h"
 #include "container/IvbBytes.h"
+#include "core/ApiError.h"
 #include "core/Errors.h"
 #include "quorin/DataBlob.h"
+#include "quorin/QVFaceModel.h"
+#include "quorin/QVFaceRepresentation.h"
 #include "quorin/QVIVBObject.h"
+#include "support/ExpectThrow.h"
 #include "support/IvbGolden.h"
+
+// Lets a test make the no-throw allocation fail, as on an exhausted heap. The
+// ordinary allocation does the work otherwise, so that deletes still match.
+static bool failNoThrowNew = false;
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
+    if (failNoThrowNew) return nullptr;
+    try {
+        return ::operator new(size);
+    } catch (...) {
+        return nullptr;
+    }
+}
 
 namespace {
 
@@ -39,101 +57,81 @@ Bytes composite(const std::vector<Bytes>& entries) {
     return object(ivb::kComposite, 0, body);
 }
 
+Bytes withByte(Bytes b, std::size_t at, uint8_t v) {
+    b[at] = v;
+    return b;
+}
+
 }  // namespace
 
-TEST(IvbGolden, CompositeWithFloatArrayBothWays) {
+TEST(IvbGolden, CompositeLayoutsBothWays) {
     const float values[2] = {1.5f, -2.0f};
     QVIVBCompositeObjectPacker packer;
+    EXPECT_EQ(packer.data(), ivbgolden::emptyComposite());
     packer.packBasicObject<float>("", 5, values, 2);
     EXPECT_EQ(packer.data(), ivbgolden::compositeWithFloats());
 
     QVIVBCompositeObjectUnpacker unpacker;
+    unpacker.parse(ivbgolden::emptyComposite());
+    EXPECT_TRUE(unpacker.objects().empty());
     unpacker.parse(ivbgolden::compositeWithFloats());
     const uint32_t id = unpacker.getObjId("", 5);
     QVIVBObjectSubType subType;
     unsigned int count = 0;
     unpacker.getBasicObjectPropertyImpl(id, subType, count);
-    EXPECT_EQ(subType.value(), 12u);
     ASSERT_EQ(count, 2u);
     float back[2] = {0, 0};
     unpacker.unpackBasicObjectImpl(id, back);
-    EXPECT_EQ(back[0], 1.5f);
-    EXPECT_EQ(back[1], -2.0f);
+    EXPECT_EQ(std::vector<float>(back, back + 2), std::vector<float>(values, values + 2));
 }
 
-TEST(IvbGolden, EmptyCompositeAndReusedPacker) {
-    QVIVBCompositeObjectPacker packer;
-    EXPECT_EQ(packer.data(), ivbgolden::emptyComposite());
-    const int v = 3;
-    packer.packBasicObject<int>("x", 9, &v, 1);
-    packer.init();
-    EXPECT_EQ(packer.data(), ivbgolden::emptyComposite());
-    QVIVBCompositeObjectUnpacker unpacker;
-    unpacker.parse(ivbgolden::emptyComposite());
-    EXPECT_TRUE(unpacker.objects().empty());
-}
-
-TEST(IvbGolden, DataPropertyBothWays) {
-    const DataProperty property(DataProperty::UINT32, 2, 3, 1);
+// The range of a property is stored for unsigned types only: the UINT32
+// property carries it, the BYTES property of the blob does not.
+TEST(IvbGolden, DataPropertyAndBlobBothWays) {
+    EXPECT_EQ(DataProperty(DataProperty::UINT32, 2, 3, 1).toIvb(), ivbgolden::uint32Property());
+    DataProperty property;
+    property.fromIvb(ivbgolden::uint32Property());
     EXPECT_EQ(property.toIvb(), ivbgolden::uint32Property());
-    DataProperty back;
-    back.fromIvb(ivbgolden::uint32Property());
-    EXPECT_EQ(back.dataType(), DataProperty::UINT32);
-    EXPECT_EQ(back.xNum(), 2u);
-    EXPECT_EQ(back.yNum(), 3u);
-    EXPECT_EQ(back.fLen(), 1u);
-    EXPECT_EQ(back.minVal(), 0u);
-    EXPECT_EQ(back.maxVal(), 0xFFFFFFFFFFFFFFFFull);
-}
-
-TEST(IvbGolden, DataBlobBothWays) {
     DataBlob blob;
     blob.setName("f");
     blob.init(DataProperty(DataProperty::BYTES, 1, 1, 2));
     blob.bytePointer()[0] = 0xAB;
     blob.bytePointer()[1] = 0xCD;
-    EXPECT_EQ(blob.toIvb(), ivbgolden::byteBlob());
-
-    DataBlob back;
-    back.fromIvb(ivbgolden::byteBlob());
-    EXPECT_EQ(back.name(), "f");
-    EXPECT_EQ(back.length(), 2u);
-    EXPECT_EQ(back.getDataProperty().ivbSubType().value(), 4u);
-    EXPECT_EQ(back.bytePointer()[0], 0xAB);
-    EXPECT_EQ(back.bytePointer()[1], 0xCD);
+    EXPECT_EQ(blob.toIvb(), ivbgolden::byteBlob());  // read back through QVFaceRepresentation below
 }
 
-TEST(IvbPacker, EmptyTextIsAHeaderOnlyCharObject) {
-    QVIVBCompositeObjectPacker packer;
-    packer.packBasicObject<char>("", 3, "", 0);
-    const Bytes bytes = packer.data();
-    EXPECT_EQ(bytes, composite({entry("", 3, object(ivb::kBasic, 3, {}))}));
-    QVIVBCompositeObjectUnpacker unpacker;
-    unpacker.parse(bytes);
-    std::string text = "old";
-    unpacker.unpackBasicObjectImpl(unpacker.getObjId("", 3), text);
-    EXPECT_EQ(text, "");
+TEST(IvbGolden, FaceHandlesBothWaysAndCopiesAreDeep) {
+    LDAModel lda;
+    lda.dimension = 2;
+    lda.projection = Eigen::Vector2f(0.5f, 0.25f);
+    lda.firstValue = 1.5f;
+    lda.secondValue = -2.0f;
+    EXPECT_EQ(FaceModelData(lda).toIvb(), ivbgolden::faceModel());
+    QVFaceModel model;
+    model.fromIvb(ivbgolden::faceModel());
+    QVFaceModel modelCopy(model);
+    model.fromIvb(QVFaceModel().toIvb());
+    EXPECT_EQ(modelCopy.toIvb(), ivbgolden::faceModel());
+
+    QVFaceRepresentation representation;
+    representation.fromIvb(ivbgolden::byteBlob());
+    EXPECT_EQ(representation.name(), "f");
+    EXPECT_EQ(representation.toIvb(), ivbgolden::byteBlob());
 }
 
 TEST(IvbUnpacker, LookupRules) {
-    const Bytes one = object(ivb::kBasic, 9, {1, 0, 0, 0});
-    const Bytes two = object(ivb::kBasic, 9, {2, 0, 0, 0});
-    const Bytes three = object(ivb::kBasic, 9, {3, 0, 0, 0});
     QVIVBCompositeObjectUnpacker unpacker;
-    unpacker.parse(composite({entry("", 4, one), entry("", 4, two), entry("named", 6, three)}));
-    ASSERT_EQ(unpacker.objects().size(), 3u);
-    EXPECT_EQ(unpacker.getObjId("", 4), 1u);  // the later duplicate wins
-    EXPECT_EQ(unpacker.getObjId("", 6), 2u);
+    unpacker.parse(composite({entry("", 4, object(ivb::kBasic, 9, {1, 0, 0, 0})),
+                              entry("", 4, object(ivb::kBasic, 9, {2, 0, 0, 0})),
+                              entry("named", 6, object(ivb::kBasic, 9, {3, 0, 0, 0}))}));
+    EXPECT_EQ(unpacker.getObjId("", 4), 1u);         // the later duplicate wins
     EXPECT_EQ(unpacker.getObjId("named", 999), 2u);  // a name makes the tag irrelevant
     expectThrowWith<std::invalid_argument>([&] { unpacker.getObjId("", 0); }, "Invalid argument passed");
-    expectThrowWith<qv_data_error>([&] { unpacker.getObjId("", 8); }, "Could not find corresponding object id");
-    expectThrowWith<qv_data_error>([&] { unpacker.getObjId("other", 4); }, "Could not find corresponding object id");
-    unpacker.release();
-    EXPECT_TRUE(unpacker.objects().empty());
+    for (const char* name : {"", "other"})
+        expectThrowWith<qv_data_error>([&] { unpacker.getObjId(name, 8); }, "Could not find corresponding object id");
 }
 
 TEST(IvbUnpacker, BasicObjectErrors) {
-    const Bytes nested = ivbgolden::emptyComposite();
     // An object whose size field says 3: parse takes those 3 bytes and reads the
     // next entry (nameless, untagged, a 240-byte array whose size field's low
     // byte doubles as the high byte of the 3) from behind them.
@@ -142,29 +140,26 @@ TEST(IvbUnpacker, BasicObjectErrors) {
     small.insert(small.end(), tail.begin(), tail.end());
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(composite({entry("", 1, object(ivb::kBasic, 99, {})), entry("", 2, object(ivb::kBasic, 0, {1, 2})),
-                              entry("", 3, nested), entry("", 4, object(ivb::kBasic, 9, {1, 2, 3})),
+                              entry("", 3, ivbgolden::emptyComposite()),
+                              entry("", 4, object(ivb::kBasic, 9, {1, 2, 3})),
                               entry("", 5, object(ivb::kBasic, 9, {7, 0, 0, 0})), entry("", 6, small)}));
     ASSERT_EQ(unpacker.objects().size(), 7u);
     EXPECT_EQ(unpacker.objects()[5].size(), 3u);
     QVIVBObjectSubType st;
-    unsigned int count = 0;
+    unsigned int count = 0, unsignedValue = 0;
     int value = 0;
-    unsigned int unsignedValue = 0;
     expectThrowWith<std::invalid_argument>([&] { unpacker.getBasicObjectPropertyImpl(0, st, count); },
                                            "Invalid IVB sub type");
-    EXPECT_THROW(unpacker.getBasicObjectPropertyImpl(1, st, count), qv_ivb_conversion_error);  // sub type 0
     expectThrowWith<std::invalid_argument>([&] { unpacker.getBasicObjectPropertyImpl(2, st, count); },
                                            "Not a valid basic IVB object id");
-    EXPECT_THROW(unpacker.getBasicObjectPropertyImpl(3, st, count), qv_ivb_conversion_error);  // 3 bytes of int
     expectThrowWith<std::invalid_argument>([&] { unpacker.getBasicObjectPropertyImpl(7, st, count); },
                                            "Not a valid object id");
-    // Object whose size field is below 16: parse keeps it, every read refuses it.
-    EXPECT_THROW(unpacker.getBasicObjectPropertyImpl(5, st, count), qv_ivb_conversion_error);
-    EXPECT_THROW(unpacker.unpackBasicObjectImpl(5, &value), qv_ivb_conversion_error);
-
-    expectThrowWith<qv_ivb_conversion_error>([&] { unpacker.unpackBasicObjectImpl(7, &value); },
-                                             "QV IVB object conversion error");
-    EXPECT_THROW(unpacker.unpackBasicObjectImpl(2, &value), qv_ivb_conversion_error);          // composite
+    // Sub type 0, 3 bytes of int, a size field below 16.
+    for (uint32_t id : {1u, 3u, 5u})
+        EXPECT_THROW(unpacker.getBasicObjectPropertyImpl(id, st, count), qv_ivb_conversion_error) << id;
+    // Size below 16, no such object, a composite.
+    for (uint32_t id : {5u, 7u, 2u})
+        EXPECT_THROW(unpacker.unpackBasicObjectImpl(id, &value), qv_ivb_conversion_error) << id;
     EXPECT_THROW(unpacker.unpackBasicObjectImpl(4, &unsignedValue), qv_ivb_conversion_error);  // no conversion
     EXPECT_THROW(unpacker.unpackBasicObjectImpl(4, &value, 0), qv_ivb_conversion_error);       // no room
     unpacker.unpackBasicObjectImpl(4, &value, 1);
@@ -173,18 +168,10 @@ TEST(IvbUnpacker, BasicObjectErrors) {
 
 TEST(IvbUnpacker, MalformedCompositesAreRefused) {
     const Bytes good = ivbgolden::compositeWithFloats();
-    auto withSize = [](Bytes b, uint64_t size) {
-        ivb::putU64(b.data(), size);
-        return b;
-    };
-    auto withByte = [](Bytes b, std::size_t at, uint8_t v) {
-        b[at] = v;
-        return b;
-    };
     const std::vector<std::pair<const char*, Bytes>> cases = {
         {"shorter than a header", Bytes(15, 0)},
-        {"size one past the length", withSize(good, good.size() + 1)},
-        {"size one short of the length", withSize(good, good.size() - 1)},
+        {"size one past the length", withByte(good, 0, static_cast<uint8_t>(good.size() + 1))},
+        {"size one short of the length", withByte(good, 0, static_cast<uint8_t>(good.size() - 1))},
         {"kind basic", withByte(good, 8, 1)},
         {"composite with a sub type", withByte(good, 9, 3)},
         {"one to three stray bytes", composite({Bytes{0, 0, 1}})},
@@ -200,46 +187,72 @@ TEST(IvbUnpacker, MalformedCompositesAreRefused) {
     }
 }
 
-TEST(IvbUnpacker, EveryTruncationAndByteDamageOfABlobFailsCleanly) {
-    const Bytes good = ivbgolden::byteBlob();
-    for (std::size_t n = 0; n < good.size(); ++n) {
-        DataBlob blob;
-        EXPECT_THROW(blob.fromIvb(Bytes(good.begin(), good.begin() + n)), qv_ivb_conversion_error) << n;
-    }
-    // Every byte set to each of a few values: either a blob whose bytes agree
-    // with its property, or an exception; never an overrun (ASan watches).
-    for (std::size_t i = 0; i < good.size(); ++i) {
-        for (uint8_t v : {0x00, 0x01, 0x10, 0x7F, 0xFF}) {
-            Bytes damaged = good;
-            damaged[i] = v;
+// Every truncation is refused; every byte set to a few values gives an
+// exception or a value that agrees with itself; never an overrun (ASan watches).
+TEST(IvbUnpacker, TruncatedAndDamagedBlobsAndModelsFailCleanly) {
+    const Bytes blobBytes = ivbgolden::byteBlob(), modelBytes = ivbgolden::faceModel();
+    for (std::size_t n = 0; n < blobBytes.size(); ++n)
+        EXPECT_THROW(DataBlob().fromIvb(Bytes(blobBytes.begin(), blobBytes.begin() + n)), qv_ivb_conversion_error) << n;
+    for (uint8_t v : {0x00, 0x01, 0x10, 0x7F, 0x80, 0xFF}) {
+        for (std::size_t i = 0; i < blobBytes.size(); ++i) {
             DataBlob blob;
             try {
-                blob.fromIvb(damaged);
+                blob.fromIvb(withByte(blobBytes, i, v));
                 EXPECT_EQ(blob.getDataProperty().byteSize(), 2u) << i;
             } catch (const std::exception&) {
             }
+        }
+        for (std::size_t i = 0; i < modelBytes.size(); ++i) {
+            FaceModelData model;
+            try {
+                model.fromIvb(withByte(modelBytes, i, v));
+            } catch (const std::exception&) {
+            }
+            EXPECT_EQ(model.projection.size(), model.dimension) << i;
         }
     }
 }
 
 TEST(IvbUnpacker, CountsThatDisagreeWithTheDataAreRefusedBeforeAllocating) {
-    // A property claiming 2^32-1 cubed floats with two bytes stored.
-    DataProperty huge(DataProperty::FLOAT32, 0xFFFFFFFFu, 0xFFFFFFFFu, 0xFFFFFFFFu);
-    QVIVBCompositeObjectPacker packer;
-    packer.packBasicObject<char>("", 38, "n", 1);
-    packer.packCompositeObject(40, huge);
-    const uint8_t two[2] = {1, 2};
-    packer.packBasicObject<void>("", 37, two, 2);
+    // A blob of two stored bytes under the given property.
+    auto blobWith = [](const DataProperty& property) {
+        QVIVBCompositeObjectPacker packer;
+        packer.packBasicObject<char>("", 38, "n", 1);
+        packer.packCompositeObject(40, property);
+        const uint8_t two[2] = {1, 2};
+        packer.packBasicObject<void>("", 37, two, 2);
+        return packer.data();
+    };
     DataBlob blob;
-    EXPECT_THROW(blob.fromIvb(packer.data()), qv_ivb_conversion_error);
+    EXPECT_THROW(blob.fromIvb(blobWith(DataProperty(DataProperty::FLOAT32, 0xFFFFFFFFu, 0xFFFFFFFFu, 0xFFFFFFFFu))),
+                 qv_ivb_conversion_error);
     EXPECT_EQ(blob.bytePointer(), nullptr);
-
     // More bytes stored than the property says: would overrun the buffer.
-    QVIVBCompositeObjectPacker longer;
-    longer.packBasicObject<char>("", 38, "n", 1);
-    longer.packCompositeObject(40, DataProperty(DataProperty::BYTES, 1, 1, 1));
-    longer.packBasicObject<void>("", 37, two, 2);
-    EXPECT_THROW(blob.fromIvb(longer.data()), qv_ivb_conversion_error);
+    EXPECT_THROW(blob.fromIvb(blobWith(DataProperty(DataProperty::BYTES, 1, 1, 1))), qv_ivb_conversion_error);
+
+    // Face models with a damaged dimension (at 36) or projection size (at 96)
+    // keep their value when refused.
+    const Bytes good = ivbgolden::faceModel();
+    auto withDimension = [&](uint32_t d) {
+        Bytes b = good;
+        for (int i = 0; i < 4; ++i) b[36 + i] = static_cast<uint8_t>(d >> (8 * i));
+        return b;
+    };
+    const std::vector<std::pair<const char*, Bytes>> models = {
+        {"dimension above the stored floats", withDimension(3)},
+        {"dimension below the stored floats", withDimension(1)},
+        {"negative dimension", withDimension(0xFFFFFFFEu)},
+        {"2^31 - 1 floats claimed", withDimension(0x7FFFFFFFu)},
+        {"dimension as float", withByte(good, 29, 0x0C)},
+        {"projection size broken", withByte(good, 96, 0x19)},
+        {"truncated", Bytes(good.begin(), good.end() - 1)},
+    };
+    for (const auto& c : models) {
+        FaceModelData data;
+        data.fromIvb(good);
+        EXPECT_THROW(data.fromIvb(c.second), std::exception) << c.first;
+        EXPECT_EQ(data.toIvb(), good) << c.first;
+    }
 }
 
 TEST(IvbUnpacker, DeepNestingIsIndexedFlatAndRefusedByTheReader) {
@@ -249,78 +262,30 @@ TEST(IvbUnpacker, DeepNestingIsIndexedFlatAndRefusedByTheReader) {
     const uint64_t total = depth * 20 + 16;
     Bytes nested(total, 0);
     for (std::size_t level = 0; level <= depth; ++level) {
-        uint8_t* at = nested.data() + level * 20;
-        ivb::putObjectHeader(at, total - level * 20, ivb::kComposite, 0);
-        if (level < depth) ivb::putU16(at + 18, 40);
+        ivb::putObjectHeader(nested.data() + level * 20, total - level * 20, ivb::kComposite, 0);
+        if (level < depth) ivb::putU16(nested.data() + level * 20 + 18, 40);
     }
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(nested);
     EXPECT_EQ(unpacker.objects().size(), 1u);
-    DataBlob blob;
-    EXPECT_THROW(blob.fromIvb(nested), std::exception);
-    DataProperty property;
-    EXPECT_THROW(property.fromIvb(nested), qv_data_error);
+    EXPECT_THROW(DataBlob().fromIvb(nested), std::exception);
+    EXPECT_THROW(DataProperty().fromIvb(nested), qv_data_error);
 }
 
-TEST(DataPropertyTest, RangeIsStoredOnlyForUnsignedTypes) {
-    struct Case {
-        DataProperty::DataType type;
-        unsigned subType;
-        bool range;
-        unsigned elementSize;
-    };
-    for (const Case& c : {Case{DataProperty::BYTES, 4, false, 1}, Case{DataProperty::UINT32, 8, true, 4},
-                          Case{DataProperty::FLOAT32, 12, false, 4}, Case{DataProperty::UINT64, 10, true, 8},
-                          Case{DataProperty::FLOAT64, 13, false, 8}, Case{DataProperty::NONE, 0, false, 0}}) {
-        DataProperty p(c.type, 3, 4, 5);
-        EXPECT_EQ(p.ivbSubType().value(), c.subType);
-        EXPECT_EQ(DataProperty(p.ivbSubType(), 1, 1, 1).dataType(), c.type);
-        EXPECT_EQ(p.byteSize(), 60u * c.elementSize);
-        EXPECT_EQ(p.gridPointByteSize(), 5u * c.elementSize);
-        p.setMinValue(11);
-        p.setMaxValue(22);
-        QVIVBCompositeObjectUnpacker unpacker;
-        unpacker.parse(p.toIvb());
-        EXPECT_EQ(unpacker.objects().size(), c.range ? 6u : 4u) << c.type;
-
-        DataProperty back;
-        back.setMinValue(5);
-        back.setMaxValue(6);
-        back.fromIvb(p.toIvb());
-        EXPECT_EQ(back.dataType(), c.type);
-        EXPECT_EQ(back.minVal(), c.range ? 11u : 5u);
-        EXPECT_EQ(back.maxVal(), c.range ? 22u : 6u);
-    }
-    EXPECT_EQ(DataProperty(QVIVBObjectSubType(9), 1, 1, 1).dataType(), DataProperty::NONE);
-}
-
-TEST(DataBlobTest, CopiesAreDeepAndInitKeepsAnEqualSizedBuffer) {
-    DataBlob a;
-    a.setName("a");
-    a.init(DataProperty(DataProperty::FLOAT32, 2, 1, 1));
-    const float v[2] = {1.0f, 2.0f};
-    std::memcpy(a.bytePointer(), v, 8);
-    DataBlob b(a);
-    b.bytePointer()[0] ^= 0xFF;
-    EXPECT_NE(a.bytePointer()[0], b.bytePointer()[0]);
-    a = a;
-    EXPECT_EQ(std::memcmp(a.bytePointer(), v, 8), 0);
-
-    uint8_t* before = a.bytePointer();
-    a.init(DataProperty(DataProperty::UINT32, 1, 2, 1));  // same 8 bytes
-    EXPECT_EQ(a.bytePointer(), before);
-    EXPECT_EQ(std::memcmp(a.bytePointer(), v, 8), 0);
-    a.init(DataProperty(DataProperty::BYTES, 0, 0, 0));
-    EXPECT_EQ(a.bytePointer(), nullptr);
-    b = a;
-    EXPECT_EQ(b.bytePointer(), nullptr);
-    EXPECT_EQ(b.name(), "a");
-}
-
-TEST(IvbSubType, StorageSizes) {
-    const unsigned expected[] = {0, 1, 1, 1, 1, 1, 2, 2, 4, 4, 8, 8, 4, 8};
-    for (unsigned i = 0; i < 14; ++i) EXPECT_EQ(storageSize(QVIVBObjectSubType(i)), expected[i]) << i;
-    expectThrowWith<std::invalid_argument>([] { storageSize(QVIVBObjectSubType(14)); }, "Invalid IVB sub type");
-    static_assert(qv_ivb_subtype_traits<unsigned long long>::type == 10, "");
-    static_assert(qv_ivb_subtype_traits<void>::type == 1, "");
+TEST(IvbFaceHandles, DamagedRepresentationsAndHandlesWithoutValueRaise) {
+    for (const Bytes& bad : {Bytes(), ivbgolden::emptyComposite(), ivbgolden::compositeWithFloats(),
+                             withByte(ivbgolden::byteBlob(), 0, 0xB0)})
+        expectThrowWith<ApiError>([&] { QVFaceRepresentation().fromIvb(bad); },
+                                  "QVFaceRepresentation could not be read from IVB");
+    QVFaceRepresentation source;
+    source.fromIvb(ivbgolden::byteBlob());
+    failNoThrowNew = true;
+    QVFaceRepresentation broken(source);
+    failNoThrowNew = false;
+    const std::string message = "QVFaceRepresentation not initialized properly";
+    expectThrowWith<ApiError>([&] { broken.name(); }, message);
+    expectThrowWith<ApiError>([&] { broken.fromIvb(ivbgolden::byteBlob()); }, message);
+    expectThrowWith<ApiError>([&] { source = broken; }, message);
+    expectThrowWith<ApiError>([&] { broken = source; }, message);
+    EXPECT_EQ(QVFaceRepresentation(broken).name(), "") << "a copy of it is a fresh, empty value";
 }

@@ -1,6 +1,8 @@
 #ifndef QUORIN_TESTS_NUMERIC_FIXTURES_H
 #define QUORIN_TESTS_NUMERIC_FIXTURES_H
 
+#include <gtest/gtest.h>
+
 #include <map>
 #include <sstream>
 #include <string>
@@ -9,37 +11,33 @@
 #include "support/SourceTree.h"
 
 // The numpy/OpenCV reference values of tools/make_numeric_fixtures.py: one
-// `name count values...` line per array.
+// `name count values...` line per array. An unknown name gives an empty array,
+// so that the test fails on its size.
 namespace fixtures {
 
-inline const std::map<std::string, std::vector<double>>& reference() {
-    static const std::map<std::string, std::vector<double>> table = [] {
-        std::map<std::string, std::vector<double>> t;
+inline std::vector<float> floats(const std::string& name) {
+    static const std::map<std::string, std::vector<float>> table = [] {
+        std::map<std::string, std::vector<float>> t;
         std::istringstream in(sourcetree::readText(sourcetree::path("tests/numeric/fixtures/numeric_reference.txt")));
         for (std::string line; std::getline(in, line);) {
-            if (line.empty() || line[0] == '#') continue;
             std::istringstream fields(line);
-            std::string name;
+            std::string key;
             std::size_t count = 0;
-            fields >> name >> count;
-            std::vector<double>& values = t[name];
-            double v = 0;
-            while (values.size() < count && fields >> v) values.push_back(v);
+            if (!(fields >> key >> count)) continue;  // blank or comment
+            for (float x = 0; t[key].size() < count && fields >> x;) t[key].push_back(x);
         }
         return t;
     }();
-    return table;
+    auto it = table.find(name);
+    return it == table.end() ? std::vector<float>() : it->second;
 }
 
-// Empty when the name is unknown, so that a test fails on its size check.
-inline std::vector<double> values(const std::string& name) {
-    auto it = reference().find(name);
-    return it == reference().end() ? std::vector<double>() : it->second;
-}
-
-inline std::vector<float> floats(const std::string& name) {
-    const std::vector<double> v = values(name);
-    return std::vector<float>(v.begin(), v.end());
+// Expects `actual` to agree with the reference `name`, element by element.
+inline void expectAgrees(const std::vector<float>& actual, const std::string& name, double tolerance) {
+    const std::vector<float> reference = floats(name);
+    ASSERT_EQ(actual.size(), reference.size()) << name;
+    for (std::size_t i = 0; i < actual.size(); ++i)
+        EXPECT_NEAR(actual[i], reference[i], tolerance) << name << "[" << i << "]";
 }
 
 }  // namespace fixtures

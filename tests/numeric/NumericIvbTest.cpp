@@ -1,16 +1,14 @@
-// Binary forms of the vector quantizer, the nearest-centroid classifier and the
-// PCA projection: the hand-written layouts in both directions, round trips of
-// larger models, and damaged bytes, each refused with its error, leaving the
-// object as it was.
+// Vector quantizer, nearest-centroid classifier and PCA projection: routing,
+// distances and the numpy projection; their binary forms in both directions;
+// and damaged bytes, each refused with its error, leaving the object as it was.
 
 #include <gtest/gtest.h>
 
 #include <cstring>
-#include <functional>
-#include <string>
-#include <vector>
 
+#include "container/IvbBytes.h"
 #include "core/Errors.h"
+#include "numeric/Fixtures.h"
 #include "quorin/ProjectionTransforms.h"
 #include "quorin/QVIVBObject.h"
 #include "quorin/VectorQuantizer.h"
@@ -20,42 +18,36 @@ namespace {
 
 using Bytes = std::vector<uint8_t>;
 
+const char* const kConversion = "QV IVB object conversion error";
+const char* const kMissing = "Could not find corresponding object id";
+
+// Loads `bytes` into an object holding `golden`: the error text, "" when it
+// loaded (and writes `bytes` back). A refused load must leave the object as it was.
+template <typename T>
+std::string loadOverGolden(const Bytes& golden, const Bytes& bytes) {
+    T object;
+    object.fromIvb(golden);
+    try {
+        object.fromIvb(bytes);
+        EXPECT_EQ(object.toIvb(), bytes);
+        return "";
+    } catch (const std::exception& e) {
+        EXPECT_EQ(object.toIvb(), golden) << "the object must stay as it was";
+        return e.what();
+    }
+}
+
 // The three classes behind one face, so that every table runs over all of them.
 struct Model {
     const char* name;
     Bytes golden;
-    std::function<Bytes(const Bytes&)> reload;  // fromIvb into a fresh object, then toIvb
-    // fromIvb into an object holding the golden model; returns its toIvb after
-    // the attempt (also when the attempt throws, through `after`).
-    std::function<void(const Bytes&, Bytes& after)> loadOverGolden;
+    std::string (*load)(const Bytes& golden, const Bytes& bytes);
 };
 
-template <typename T>
-Model model(const char* name, const Bytes& golden) {
-    return Model{name, golden,
-                 [](const Bytes& bytes) {
-                     T object;
-                     object.fromIvb(bytes);
-                     return object.toIvb();
-                 },
-                 [golden](const Bytes& bytes, Bytes& after) {
-                     T object;
-                     object.fromIvb(golden);
-                     try {
-                         object.fromIvb(bytes);
-                     } catch (...) {
-                         after = object.toIvb();
-                         throw;
-                     }
-                     after = object.toIvb();
-                 }};
-}
-
-std::vector<Model> models() {
-    return {model<VectorQuantizer>("VectorQuantizer", ivbgolden::vectorQuantizer()),
-            model<NearestCentroidClassifier>("NearestCentroidClassifier", ivbgolden::nearestCentroids()),
-            model<PcaTransform>("PcaTransform", ivbgolden::pcaTransform())};
-}
+const std::vector<Model> kModels = {
+    {"VectorQuantizer", ivbgolden::vectorQuantizer(), &loadOverGolden<VectorQuantizer>},
+    {"NearestCentroidClassifier", ivbgolden::nearestCentroids(), &loadOverGolden<NearestCentroidClassifier>},
+    {"PcaTransform", ivbgolden::pcaTransform(), &loadOverGolden<PcaTransform>}};
 
 template <typename T>
 Bytes raw(std::initializer_list<T> values) {
@@ -63,8 +55,6 @@ Bytes raw(std::initializer_list<T> values) {
     std::memcpy(out.data(), values.begin(), out.size());
     return out;
 }
-Bytes floats(std::initializer_list<float> values) { return raw(values); }
-Bytes uints(std::initializer_list<uint32_t> values) { return raw(values); }
 
 // One member: a basic object of any sub type over raw element bytes.
 struct Member {
@@ -77,16 +67,60 @@ constexpr uint8_t kF = 12, kU = 8, kI = 9, kC = 3, kUC = 4;
 Bytes composite(const std::vector<Member>& members) {
     QVIVBCompositeObjectPacker packer;
     for (const Member& m : members) {
-        Bytes object(16, 0);
-        const uint64_t size = 16 + m.elements.size();
-        for (int i = 0; i < 8; ++i) object[static_cast<size_t>(i)] = static_cast<uint8_t>(size >> (8 * i));
-        object[8] = 1;
-        object[9] = m.subType;
-        object.insert(object.end(), m.elements.begin(), m.elements.end());
+        Bytes object(16 + m.elements.size());
+        ivb::putObjectHeader(object.data(), object.size(), ivb::kBasic, m.subType);
+        std::copy(m.elements.begin(), m.elements.end(), object.begin() + 16);
         packer.appendObjInfo(std::string(), m.tag);
         packer.appendObj(object);
     }
     return packer.data();
+}
+
+}  // namespace
+
+TEST(VectorQuantizer, RoutesThroughTheTreeAndRefusesTreesThatDoNotFit) {
+    EXPECT_THROW(VectorQuantizer().quantize(nullptr), qv_operation_error);
+    // Node 0 splits on x at 0, node 1 on y at 0, node 2 on x + y at 10; leaves
+    // carry codes 0..3. Below the threshold goes left, ties go right.
+    VectorQuantizer q;
+    q.setTree(3, 2, {1, 0, 0, 1, 1, 1}, {0, 0, 10});
+    for (const auto& c : std::vector<std::pair<std::vector<float>, unsigned>>{
+             {{-1, -1}, 0}, {{-1, 0}, 1}, {{-5, 3}, 1}, {{0, 0}, 2}, {{4, 5}, 2}, {{4, 6}, 3}, {{20, -1}, 3}})
+        EXPECT_EQ(q.quantize(c.first.data()), c.second) << c.first[0] << "," << c.first[1];
+    EXPECT_THROW(q.setTree(3, 2, {1, 0, 0, 1, 1}, {0, 0, 10}), qv_invalid_argument);
+    EXPECT_THROW(q.setTree(2, 2, {1, 0, 0, 1}, {0}), qv_invalid_argument);
+    EXPECT_THROW(q.setTree(1, 0, {}, {0}), qv_invalid_argument);
+    EXPECT_EQ(q.codeNum(), 4u);
+    // No inner node: one leaf of code 0 that never reads the vector.
+    q.fromIvb(composite({{96, kU, raw<uint32_t>({0})}, {64, kU, raw<uint32_t>({7})}, {97, kF, {}}, {98, kF, {}}}));
+    EXPECT_EQ(q.quantize(nullptr), 0u);
+}
+
+TEST(NearestCentroidClassifier, L1DistanceTiesAndChecks) {
+    const NearestCentroidClassifier c(3, {{0, 0, 0}, {10, 10, 10}, {1, -1, 0}, {-1, 1, 0}}, "L1");
+    EXPECT_EQ(c.classify({0.9f, -1.1f, 0}), 2u);
+    EXPECT_EQ(c.classify({1, 0, 0}), 0u) << "rows 0 and 2 are both at 1; the earlier wins";
+    EXPECT_THROW(c.classify({1, 2}), qv_data_error);
+    EXPECT_THROW(NearestCentroidClassifier(2, {{1, 2}}, "L2").classify({5, 5}), qv_operation_error);
+    EXPECT_THROW(NearestCentroidClassifier(2, {{1, 2}, {3}}, "L1"), qv_invalid_argument);
+}
+
+TEST(PcaTransform, MatchesNumpyAndChecksSizes) {
+    const std::vector<float> mean = fixtures::floats("pca_mean"), rows = fixtures::floats("pca_projection_rows");
+    std::vector<float> input = fixtures::floats("pca_input");
+    ASSERT_EQ(mean.size(), 24u);
+    ASSERT_EQ(rows.size(), 5u * 24u);
+    ASSERT_EQ(input.size(), 24u);
+    const Eigen::MatrixXf projection = Eigen::Map<const Eigen::Matrix<float, 5, 24, Eigen::RowMajor>>(rows.data());
+    const PcaTransform pca(Eigen::Map<const Eigen::VectorXf>(mean.data(), 24), projection);
+    std::vector<float> out(6, -7.0f);
+    EXPECT_THROW(pca.transform(input.data(), 23, out.data()), qv_invalid_argument);
+    input.push_back(1e9f);  // a longer input is read only up to rawDim
+    pca.transform(input.data(), 25, out.data());
+    EXPECT_EQ(out[5], -7.0f) << "written past pcaDim";
+    out.pop_back();
+    fixtures::expectAgrees(out, "pca_output", 1e-4);
+    EXPECT_THROW(PcaTransform(Eigen::VectorXf::Zero(3), Eigen::MatrixXf::Zero(2, 4)), qv_invalid_argument);
 }
 
 TEST(NumericIvb, HandWrittenLayoutsBothWays) {
@@ -98,97 +132,51 @@ TEST(NumericIvb, HandWrittenLayoutsBothWays) {
     projection << 1, 2, 3, 4, 0.5f, -1;
     EXPECT_EQ(PcaTransform(Eigen::Vector3f(0.5f, 1, 2), projection).toIvb(), ivbgolden::pcaTransform());
 
-    for (const Model& m : models()) EXPECT_EQ(m.reload(m.golden), m.golden) << m.name;
-
-    // What was read works: the hyperplane x - y against 0.5, the nearest row,
-    // the projection with (1, 2) read from stored element 5.
-    VectorQuantizer loaded;
-    loaded.fromIvb(ivbgolden::vectorQuantizer());
-    const float right[2] = {1, 0}, left[2] = {0, 1};
-    EXPECT_EQ(loaded.quantize(right), 1u);
-    EXPECT_EQ(loaded.quantize(left), 0u);
-    NearestCentroidClassifier centroids;
-    centroids.fromIvb(ivbgolden::nearestCentroids());
-    EXPECT_EQ(centroids.classify({2.9f, 4}), 1u);
+    // Matrices are stored row by row: (1, 2) = -1 is element 5.
     PcaTransform pca;
     pca.fromIvb(ivbgolden::pcaTransform());
     EXPECT_EQ(pca.projection()(1, 2), -1.0f);
-    const float input[3] = {1.5f, 2, 3};
-    float output[2] = {0, 0};
-    pca.transform(input, 3, output);
-    EXPECT_FLOAT_EQ(output[0], 6.0f);
-    EXPECT_FLOAT_EQ(output[1], 3.5f);
-}
-
-TEST(NumericIvb, RoundTripsKeepTheTree) {
-    VectorQuantizer q;
-    q.setTree(3, 2, {1, 0, 0, 1, 1, 1}, {0, 0, 10});
-    VectorQuantizer q2;
-    q2.fromIvb(q.toIvb());
-    EXPECT_EQ(q2.toIvb(), q.toIvb());
-    for (const auto& v : std::vector<std::vector<float>>{{-1, -1}, {-1, 0}, {0, 0}, {4, 6}, {20, -1}})
-        EXPECT_EQ(q2.quantize(v.data()), q.quantize(v.data()));
-    // No inner node: one leaf of code 0 that never reads the vector.
-    q2.fromIvb(composite({{96, kU, uints({0})}, {64, kU, uints({7})}, {97, kF, {}}, {98, kF, {}}}));
-    EXPECT_EQ(q2.codeNum(), 1u);
-    EXPECT_EQ(q2.quantize(nullptr), 0u);
+    for (const Model& m : kModels) EXPECT_EQ(m.load(m.golden, m.golden), "") << m.name;
 }
 
 TEST(NumericIvb, EveryTruncationIsRefused) {
-    for (const Model& m : models()) {
-        for (size_t n = 0; n < m.golden.size(); ++n) {
-            Bytes after;
-            EXPECT_THROW(m.loadOverGolden(Bytes(m.golden.begin(), m.golden.begin() + static_cast<long>(n)), after),
-                         qv_ivb_conversion_error)
+    for (const Model& m : kModels) {
+        for (size_t n = 0; n < m.golden.size(); ++n)
+            EXPECT_EQ(m.load(m.golden, Bytes(m.golden.begin(), m.golden.begin() + static_cast<long>(n))), kConversion)
                 << m.name << " cut at " << n;
-            EXPECT_EQ(after, m.golden) << m.name << " cut at " << n;
-        }
     }
 }
 
 TEST(NumericIvb, DamagedMembersGetTheirErrors) {
-    enum Error { kConversion, kMissing };
     struct Case {
         const char* what;
-        size_t model;  // index into models()
+        size_t model;  // index into kModels
         std::vector<Member> members;
-        Error error;
+        const char* error;
     };
-    const Bytes w = floats({1, -1}), t = floats({0.5f}), two = uints({2}), one = uints({1});
-    const Bytes rows = floats({1, 2, 3, 4}), metric = {'L', '1'};
+    const Bytes w = raw<float>({1, -1}), t = raw<float>({0.5f}), two = raw<uint32_t>({2}), one = raw<uint32_t>({1});
+    const Bytes rows = raw<float>({1, 2, 3, 4}), metric = {'L', '1'}, zero = raw<uint32_t>({0});
     const std::vector<Case> cases = {
         {"more inner nodes than arrays", 0, {{96, kU, two}, {64, kU, two}, {97, kF, w}, {98, kF, t}}, kConversion},
         {"thresholds missing", 0, {{96, kU, one}, {64, kU, two}, {97, kF, w}}, kMissing},
         {"innerNodeNum stored as int", 0, {{96, kI, one}, {64, kU, two}, {97, kF, w}, {98, kF, t}}, kConversion},
         {"weights of sub type 0", 0, {{96, kU, one}, {64, kU, two}, {97, 0, w}, {98, kF, t}}, kConversion},
-        {"heap indices beyond int", 0, {{96, kU, uints({0x3FFFFFFF})}, {64, kU, uints({0})}, {97, kF, {}}, {98, kF, t}},
-         kConversion},
-        {"many rows of dimension 0", 1, {{64, kU, uints({0})}, {192, kU, uints({0xFFFFFFFF})}, {193, kF, {}}, {194, kC, metric}},
-         kConversion},
+        {"heap indices beyond int", 0,
+         {{96, kU, raw<uint32_t>({0x3FFFFFFF})}, {64, kU, zero}, {97, kF, {}}, {98, kF, t}}, kConversion},
+        {"many rows of dimension 0", 1,
+         {{64, kU, zero}, {192, kU, raw<uint32_t>({0xFFFFFFFF})}, {193, kF, {}}, {194, kC, metric}}, kConversion},
         {"counts whose product wraps 32 bits", 1,
-         {{64, kU, uints({0x10000})}, {192, kU, uints({0x10000})}, {193, kF, {}}, {194, kC, metric}}, kConversion},
-        {"metric as unsigned char", 1, {{64, kU, two}, {192, kU, two}, {193, kF, rows}, {194, kUC, metric}}, kConversion},
-        {"outputs from no input", 2, {{64, kU, uints({0})}, {128, kU, uints({0x40000000})}, {129, kF, {}}, {130, kF, {}}},
+         {{64, kU, raw<uint32_t>({0x10000})}, {192, kU, raw<uint32_t>({0x10000})}, {193, kF, {}}, {194, kC, metric}},
          kConversion},
+        {"metric as unsigned char", 1, {{64, kU, two}, {192, kU, two}, {193, kF, rows}, {194, kUC, metric}},
+         kConversion},
+        {"outputs from no input", 2,
+         {{64, kU, zero}, {128, kU, raw<uint32_t>({0x40000000})}, {129, kF, {}}, {130, kF, {}}}, kConversion},
         {"mean longer than rawDim", 2, {{64, kU, one}, {128, kU, one}, {129, kF, w}, {130, kF, t}}, kConversion},
         {"pcaDim missing", 2, {{64, kU, one}, {129, kF, t}, {130, kF, t}}, kMissing},
     };
-    const std::vector<Model> all = models();
     for (const Case& c : cases) {
-        const Model& m = all[c.model];
-        Bytes after;
-        try {
-            m.loadOverGolden(composite(c.members), after);
-            ADD_FAILURE() << c.what << ": loaded";
-        } catch (const qv_ivb_conversion_error& e) {
-            EXPECT_EQ(c.error, kConversion) << c.what;
-            EXPECT_STREQ(e.what(), "QV IVB object conversion error") << c.what;
-        } catch (const qv_data_error& e) {
-            EXPECT_EQ(c.error, kMissing) << c.what;
-            EXPECT_STREQ(e.what(), "Could not find corresponding object id") << c.what;
-        }
-        EXPECT_EQ(after, m.golden) << c.what << ": the object must stay as it was";
+        const Model& m = kModels[c.model];
+        EXPECT_EQ(m.load(m.golden, composite(c.members)), c.error) << c.what;
     }
 }
-
-}  // namespace
