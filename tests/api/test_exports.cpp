@@ -97,10 +97,7 @@ TEST(SharedLibraryHost, RecordsAndEntriesWorkThroughTheExportedInterface) {
     EXPECT_EQ(copy.faceRect().bottom, 4);
     EXPECT_EQ(copy.landmark("nose").y, 0.25f);
     EXPECT_THROW(copy.fromJson("[]"), ApiError) << "the library's own exception type is seen by the host";
-    EXPECT_THROW(copy.landmark("chin"), std::invalid_argument);
     Rect2<int32_t> rect;
-    rect.fromJson(data.faceRect().toJson());
-    EXPECT_EQ(rect, data.faceRect());
     EXPECT_THROW(rect.fromJson("[1,2,3]"), JsonError);
 
     quorin_release();

@@ -29,8 +29,6 @@ using Faces = std::vector<FaceData>;
 constexpr int kSentinel = 0x5A5A5A5A;
 Blocks blocks(int count) { return Blocks(static_cast<size_t>(count) * 17, kSentinel); }
 const int* block(const Blocks& b, int k) { return b.data() + 17 * k; }
-// Ints 3..6 of the first block: top, bottom, left, right.
-Blocks rect(const Blocks& b) { return Blocks(b.begin() + 3, b.begin() + 7); }
 
 class QuorinApiTest : public ::testing::Test {
 protected:
@@ -63,7 +61,6 @@ TEST(QuorinSession, WithoutAWorkingSessionNothingIsTouched) {
     Frame frame = patternFrame(64, 48);
     Blocks out = blocks(2);
     EXPECT_EQ(quorin_detectScaled(frame.data(), 64, 48, out.data(), 2, 90), 0);
-    EXPECT_EQ(quorin_detect360Tracking(frame.data(), 64, 48, out.data(), 2), 0);
     EXPECT_THROW(quorin_setDetectionMode(sessionSnapshot().detectionMode == 1 ? 2u : 1u), ApiError)
         << "a mode change needs a session";
 
@@ -73,9 +70,7 @@ TEST(QuorinSession, WithoutAWorkingSessionNothingIsTouched) {
     EXPECT_THROW(quorin_init(), ApiError);
     EXPECT_TRUE(sessionSnapshot().open && !sessionSnapshot().buffersAllocated);
     EXPECT_THROW(quorin_detect(frame.data(), 64, 48, out.data(), 1, 0), ApiError);
-    EXPECT_THROW(quorin_detect360High(frame.data(), 64, 48, out.data(), 1), ApiError);
     quorin_release();
-    EXPECT_FALSE(sessionSnapshot().open);
     EXPECT_EQ(frame, patternFrame(64, 48));
     EXPECT_EQ(out, blocks(2));
     EXPECT_TRUE(stages.frames.empty() && failing.frames.empty());
@@ -128,25 +123,6 @@ TEST_F(QuorinApiTest, BlockHoldsRollRectangleAndLandmarksInHostPixels) {
     face.setLandmark("nose", Point2<float>(100.49999f, 7.25f));
     out = detectOnce({face}, 640, 480, 1, 0);
     EXPECT_EQ((Blocks{out[3], out[4], out[5], out[6], out[15], out[16]}), (Blocks{40, 168, 20, 148, 201, 14}));
-}
-
-TEST_F(QuorinApiTest, ScaleFollowsTheRequestedTurnEvenWhenTheFrameWasNotTurned) {
-    struct Case {
-        int W, H, rotation, workWidth;
-        Blocks face, expected;  // left, top, right, bottom in; the block's order out
-    };
-    // 640 x 480 is above the turn bound: analysed as it is, yet scaled as if
-    // turned. 45 is neither turned nor swapped; 450 is turned, the scale not swapped.
-    const Case cases[] = {{640, 480, 90, 640, {100, 60, 300, 240}, {80, 320, 75, 225}},
-                          {40, 20, 45, 40, {4, 2, 14, 12}, {2, 12, 4, 14}},
-                          {40, 20, 450, 20, {4, 2, 14, 12}, {1, 6, 8, 28}}};
-    for (const Case& c : cases) {
-        SCOPED_TRACE(c.rotation);
-        const FaceData face = makeFace(c.face[0], c.face[1], c.face[2], c.face[3], 1.0f);
-        const Blocks out = detectOnce({face}, c.W, c.H, 1, c.rotation);
-        EXPECT_EQ(stages.frames.back().width, c.workWidth);
-        EXPECT_EQ(rect(out), c.expected);
-    }
 }
 
 TEST_F(QuorinApiTest, FacesAreOrderedByTheirTextScores) {
