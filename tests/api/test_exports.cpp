@@ -21,19 +21,16 @@
 
 namespace {
 
-// Defined dynamic symbols, demangled. nm prints "address type name", and a
-// demangled name may hold blanks.
+// Defined dynamic symbols, demangled, one a line (a name may hold blanks).
 std::set<std::string> exportedSymbols() {
     std::set<std::string> names;
-    FILE* pipe = popen((std::string("nm -D -C --defined-only '") + QUORIN_SHARED_LIBRARY + "'").c_str(), "r");
+    FILE* pipe = popen((std::string("nm -D -C -j --defined-only '") + QUORIN_SHARED_LIBRARY + "'").c_str(), "r");
     if (pipe == nullptr) return names;
     char buffer[4096];
     while (fgets(buffer, sizeof buffer, pipe) != nullptr) {
         std::string line(buffer);
         if (!line.empty() && line.back() == '\n') line.pop_back();
-        const std::string::size_type type = line.find(' ');
-        const std::string::size_type name = type == std::string::npos ? type : line.find(' ', type + 1);
-        if (name != std::string::npos) names.insert(line.substr(name + 1));
+        if (!line.empty()) names.insert(line);
     }
     pclose(pipe);
     return names;

@@ -31,12 +31,6 @@ constexpr int kWindow = 24;
 
 #if defined(__SANITIZE_ADDRESS__)
 constexpr bool kSanitized = true;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer)
-constexpr bool kSanitized = true;
-#else
-constexpr bool kSanitized = false;
-#endif
 #else
 constexpr bool kSanitized = false;
 #endif
