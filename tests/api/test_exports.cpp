@@ -90,10 +90,8 @@ TEST(SharedLibraryHost, RecordsAndEntriesWorkThroughTheExportedInterface) {
     data.setLandmark("nose", Point2<float>(0.5f, 0.25f));
     QVFace face;
     face.fromJson(data.toJson());
-    QVFace copy(face);
-    EXPECT_EQ(copy.faceRect().bottom, 4);
-    EXPECT_EQ(copy.landmark("nose").y, 0.25f);
-    EXPECT_THROW(copy.fromJson("[]"), ApiError) << "the library's own exception type is seen by the host";
+    EXPECT_EQ(QVFace(face).landmark("nose").y, 0.25f);
+    EXPECT_THROW(face.fromJson("[]"), ApiError) << "the library's own exception type is seen by the host";
     Rect2<int32_t> rect;
     EXPECT_THROW(rect.fromJson("[1,2,3]"), JsonError);
 

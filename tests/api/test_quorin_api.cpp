@@ -83,8 +83,7 @@ TEST_F(QuorinApiTest, WorkFrameIsShrunkToTheModesLongSideAndTurned) {
     quorin_detect(b.data(), 1280, 1280, out.data(), 1, 0);
     quorin_detect(a.data(), 640, 480, out.data(), 1, 180);  // shrink, then turn into the host's memory
     quorin_detect(c.data(), 40, 20, out.data(), 1, 90);     // turn only, into the frame buffer
-    quorin_detect(c.data(), 40, 20, out.data(), 1, 360);    // a copy, nothing else
-    ASSERT_EQ(stages.frames.size(), 5u);
+    ASSERT_EQ(stages.frames.size(), 4u);
     const auto& f = stages.frames;
     EXPECT_EQ(f[0].pointer, a.data());
     EXPECT_EQ(std::make_pair(f[1].width, f[1].height), std::make_pair(320, 320));
@@ -96,11 +95,9 @@ TEST_F(QuorinApiTest, WorkFrameIsShrunkToTheModesLongSideAndTurned) {
             ASSERT_EQ(f[2].pixels[(239 - y) * 320 + (319 - x)], original[(2 * y) * 640 + 2 * x]);
     EXPECT_EQ(std::make_pair(f[3].width, f[3].height), std::make_pair(20, 40));
     EXPECT_NE(f[3].pointer, c.data());
-    EXPECT_EQ(f[4].pixels, c);
-    EXPECT_NE(f[4].pointer, c.data());
     EXPECT_EQ(c, patternFrame(40, 20)) << "a turn without shrink leaves the host frame alone";
     // Smallest face an eighth of the shorter side, never below 32.
-    const std::vector<std::pair<int, int>> ranges = {{60, 480}, {40, 320}, {32, 240}, {32, 20}, {32, 20}};
+    const std::vector<std::pair<int, int>> ranges = {{60, 480}, {40, 320}, {32, 240}, {32, 20}};
     EXPECT_EQ(stages.sizeRanges, ranges);
 }
 
@@ -288,7 +285,6 @@ TEST_F(QuorinApiTest, BadFrameArgumentsAreRefusedWithoutChangingTheSession) {
     EXPECT_THROW(quorin_detect(frame.data(), 65536, 65536, out.data(), 1, 0), qv_invalid_argument);
     EXPECT_THROW(quorin_detectScaled(frame.data(), 64, 0, out.data(), 1, 0), qv_invalid_argument);
     EXPECT_THROW(quorin_detect360Tracking(frame.data(), 0, 0, out.data(), 1), qv_invalid_argument);
-    EXPECT_THROW(quorin_detect360High(nullptr, 64, 48, out.data(), 1), qv_invalid_argument);
     EXPECT_EQ(sessionSnapshot().orientation, before.orientation);
     EXPECT_EQ(sessionSnapshot().detectionMode, before.detectionMode);
     EXPECT_TRUE(stages.frames.empty());

@@ -96,11 +96,6 @@ CliRun runCli(const std::vector<std::string>& args, const Bytes& input = {}) {
 
 bool contains(const std::string& text, const std::string& part) { return text.find(part) != std::string::npos; }
 
-// Runs past the engine are only meaningful when a session opens in this build.
-#define SKIP_IF_ENGINE_CANNOT_START(run)                      \
-  if ((run).status == 3 && contains((run).err, "initialisation")) \
-  GTEST_SKIP() << "the engine does not start in this build: " << (run).err
-
 }  // namespace
 
 TEST(ImageDecoding, ReadsPngAndPgmAsTheSamePictureWithRoundedLuma) {
@@ -135,9 +130,8 @@ TEST(ImageDecoding, DamagedBytesGiveACleanImageOrImageError) {
     for (const Bytes& bytes : damaged) {
       try {
         const Image im = decodeImage(bytes);
-        ASSERT_GT(im.width, 0);
-        ASSERT_GT(im.height, 0);
-        ASSERT_EQ(im.pixels.size(), static_cast<std::size_t>(im.width) * im.height * 3);
+        ASSERT_TRUE(im.width > 0 && im.height > 0 &&
+                    im.pixels.size() == static_cast<std::size_t>(im.width) * im.height * 3);
       } catch (const ImageError&) {
       }
     }
@@ -218,8 +212,7 @@ TEST(Annotation, ClipsAnyCoordinatesToTheImage) {
 
 TEST(JsonText, EscapesEveryFileNameIntoValidJson) {
   const std::vector<std::pair<std::string, std::string>> cases = {
-      {"a\"b\\c", R"("a\"b\\c")"},
-      {std::string("x\n\t\x01\x7f", 5), R"("x\n\t\u0001\u007f")"},
+      {"a\"b\\c\n\t\x01\x7f", R"("a\"b\\c\n\t\u0001\u007f")"},
       // An overlong form and a cut sequence.
       {"\xc0\x80", R"("\ufffd\ufffd")"},
       {"ab\xe2\x82", R"("ab\ufffd\ufffd")"},
@@ -266,7 +259,6 @@ TEST(CommandLine, BadInputEndsWithItsStatusAndAClearMessage) {
 TEST(CommandLine, ImagesAndRawFramesGiveOneJsonLineEach) {
   const std::string out = tempDir() + "/plain-annotated.png";
   CliRun r = runCli({"--annotate", out, writeTemp("plain.pgm", pgmBytes(toGray(pattern(160, 120, 3))))});
-  SKIP_IF_ENGINE_CANNOT_START(r);
   ASSERT_EQ(r.status, 0) << r.err;
   EXPECT_EQ(r.out.rfind("{\"file\":", 0), 0u);
   EXPECT_TRUE(contains(r.out, "\"width\":160,\"height\":120") && contains(r.out, "\"faces\":[")) << r.out;
@@ -315,7 +307,6 @@ TEST(TrackerOption, KalmanThroughTheDetectorClassMatchesTheTrackingMode) {
   const std::string size = std::to_string(gray.width) + "x" + std::to_string(gray.height);
 
   const CliRun api = runCli({"--raw", size}, frames);
-  SKIP_IF_ENGINE_CANNOT_START(api);
   ASSERT_EQ(api.status, 0) << api.err;
   const CliRun kf = runCli({"--raw", size, "--tracker", "kf"}, frames);
   ASSERT_EQ(kf.status, 0) << kf.err;
@@ -340,7 +331,6 @@ TEST(JvwOutput, RecordsTheFacesOfTheJsonLineAndRoundTrips) {
   const std::string odd = tempDir() + "/we\"ird{.jpg", jvw = tempDir() + "/faces.jvw";
   ASSERT_EQ(std::system(("cp " + shellQuote(photo) + " " + shellQuote(odd)).c_str()), 0);
   const CliRun r = runCli({"--jvw", jvw, odd, photo});
-  SKIP_IF_ENGINE_CANNOT_START(r);
   EXPECT_EQ(r.status, 1);
   EXPECT_TRUE(contains(r.err, "can't be stored in a JVW record")) << r.err;
 

@@ -18,18 +18,22 @@ namespace {
 
 constexpr int kFrame = kPatch + 2; // the window sits at (1, 1), strictly inside
 
+// The window at (1, 1), as left, right, top, bottom.
+const DetectionWindow kWindow{1, 1 + kPatch, 1, 1 + kPatch};
+
 // Windows of a textured frame: "faces" are darker in the upper band and
-// brighter in the middle; the rest is noise of the same contrast.
+// brighter in the middle; the rest is noise of the same contrast. Each is
+// also cut as the trainer cuts it: the patch and the engine's inverse deviation.
 struct Synthetic {
     std::vector<std::vector<uint8_t>> frames;
     std::vector<bool> face;
+    SampleSet pos, neg;
 };
 
-Synthetic makeWindows(int count, uint32_t seed)
+void makeWindows(int count, uint32_t seed, Synthetic& s)
 {
     std::mt19937 rng(seed);
     std::uniform_int_distribution<int> noise(-40, 40);
-    Synthetic s;
     for (int i = 0; i < count; ++i) {
         const bool face = i % 2 == 0;
         std::vector<uint8_t> f(kFrame * kFrame);
@@ -40,24 +44,13 @@ Synthetic makeWindows(int count, uint32_t seed)
                     v += (y >= 6 && y < 11) ? -50 : (y >= 12 && y < 18 ? 40 : 0);
                 f[y * kFrame + x] = static_cast<uint8_t>(std::clamp(v, 0, 255));
             }
-        s.frames.push_back(std::move(f));
-        s.face.push_back(face);
-    }
-    return s;
-}
-
-// The window at (1, 1), as left, right, top, bottom.
-const DetectionWindow kWindow{1, 1 + kPatch, 1, 1 + kPatch};
-
-// Samples as the trainer cuts them: the patch and the engine's inverse deviation.
-void toSamples(Synthetic const& s, SampleSet& positives, SampleSet& negatives)
-{
-    for (size_t i = 0; i < s.frames.size(); ++i) {
         IN_IMAGE image;
-        ASSERT_TRUE(image.Init(kFrame, kFrame, kFrame, s.frames[i].data()));
+        ASSERT_TRUE(image.Init(kFrame, kFrame, kFrame, f.data()));
         uint8_t patch[kPatch * kPatch];
         ASSERT_TRUE(cutPatch(image.data, kFrame, kFrame, 1, 1, kPatch, false, patch));
-        (s.face[i] ? positives : negatives).add(patch, image.ComputeNorm(kWindow));
+        (face ? s.pos : s.neg).add(patch, image.ComputeNorm(kWindow));
+        s.frames.push_back(std::move(f));
+        s.face.push_back(face);
     }
 }
 
@@ -80,10 +73,9 @@ Cascade trainCascade(SampleSet const& pos, SampleSet const& neg)
 
 TEST(CascadeTrainer, WrittenModelDecidesInTheEngineAsTrained)
 {
-    const Synthetic s = makeWindows(300, 2);
-    SampleSet pos, neg;
-    toSamples(s, pos, neg);
-    const Cascade c = trainCascade(pos, neg);
+    Synthetic s;
+    makeWindows(300, 2, s);
+    const Cascade c = trainCascade(s.pos, s.neg);
     const ScopedModel model("trainedcascade", CascadeWriter::toBytes(c.toModel()));
     CascadeDetector engine(R"({"model":"trainedcascade","imageMaxSize":64,"faceMinSize":24,"faceMaxSize":24})");
     engine.prepareForFastComputing(kFrame + 1);
@@ -91,7 +83,7 @@ TEST(CascadeTrainer, WrittenModelDecidesInTheEngineAsTrained)
     for (size_t i = 0; i < s.frames.size(); ++i) {
         IN_IMAGE image;
         ASSERT_TRUE(image.Init(kFrame, kFrame, kFrame, s.frames[i].data()));
-        SampleSet const& set = s.face[i] ? pos : neg;
+        SampleSet const& set = s.face[i] ? s.pos : s.neg;
         const size_t k = i / 2; // faces and non-faces alternate
         float score = 0, categories[16];
         int stage = 0;
