@@ -63,11 +63,10 @@ TEST(QuorinSession, WithoutAWorkingSessionNothingIsTouched) {
     EXPECT_THROW(quorin_setDetectionMode(sessionSnapshot().detectionMode == 1 ? 2u : 1u), ApiError)
         << "a mode change needs a session";
 
-    // A failed init leaves a handle without buffers: every entry refuses.
+    // A failed init leaves a session that refuses every frame.
     FailingInitStages failing;
     setPipelineStagesOverride(&failing);
     EXPECT_THROW(quorin_init(), ApiError);
-    EXPECT_TRUE(sessionSnapshot().open && !sessionSnapshot().buffersAllocated);
     EXPECT_THROW(quorin_detect(frame.data(), 64, 48, out.data(), 1, 0), ApiError);
     quorin_release();
     EXPECT_EQ(frame, patternFrame(64, 48));
@@ -78,14 +77,13 @@ TEST(QuorinSession, WithoutAWorkingSessionNothingIsTouched) {
 TEST_F(QuorinApiTest, WorkFrameIsShrunkToTheModesLongSideAndTurned) {
     Frame a = patternFrame(640, 480), b = patternFrame(1280, 1280), c = patternFrame(40, 20);
     Blocks out = blocks(1);
-    quorin_detect(a.data(), 640, 480, out.data(), 1, 0);  // mode 2, at the target: in place
+    quorin_detect(a.data(), 640, 480, out.data(), 1, 0);  // mode 2, at the target
     quorin_setDetectionMode(1);
     quorin_detect(b.data(), 1280, 1280, out.data(), 1, 0);
     quorin_detect(a.data(), 640, 480, out.data(), 1, 180);  // shrink, then turn into the host's memory
     quorin_detect(c.data(), 40, 20, out.data(), 1, 90);     // turn only, into the frame buffer
     ASSERT_EQ(stages.frames.size(), 4u);
     const auto& f = stages.frames;
-    EXPECT_EQ(f[0].pointer, a.data());
     EXPECT_EQ(std::make_pair(f[1].width, f[1].height), std::make_pair(320, 320));
     EXPECT_EQ(std::make_pair(f[2].width, f[2].height), std::make_pair(320, 240));
     EXPECT_EQ(f[2].pointer, a.data());
@@ -224,7 +222,6 @@ TEST_F(QuorinApiTest, TrackingSearchHoldsTheTurnThatWorkedForFiveFrames) {
     stages.script = {{}, {}, one};
     EXPECT_EQ(quorin_detect360Tracking(frame.data(), W, H, out.data(), 1), 1);
     EXPECT_EQ(turnsSeen(stages, 0, host, W, H), (std::vector<int>{0, 90, 180}));
-    for (const auto& f : stages.frames) EXPECT_NE(f.pointer, frame.data()) << "the search works on a copy";
     EXPECT_EQ(sessionSnapshot().detectionMode, 0);
 
     stages.script = {one};

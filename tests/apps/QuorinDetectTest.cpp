@@ -153,8 +153,8 @@ TEST(OptionParsing, PicksTheEntryForTheModeOfTheRun) {
 TEST(OptionParsing, RefusesBadValuesAndContradictions) {
   for (auto args : std::vector<std::vector<std::string>>{
            {"--mode", "3", "a.png"}, {"--mode"}, {"--rotation", "45", "a.png"}, {"--max-faces", "101", "a.png"},
-           {"--bogus", "a.png"}, {"--raw", "0x10"}, {"--raw", "99999x10"}, {"--raw", "99999999999999x1"},
-           {"--tracker", "KF", "--raw", "8x8"}, {}, {"--raw", "8x8", "a.png"}, {"--annotate", "o.png", "a.png", "b.png"},
+           {"--bogus", "a.png"}, {"--raw", "0x10"}, {"--raw", "99999x10"}, {"--raw", "99999999999999x1"}, {},
+           {"--tracker", "KF", "--raw", "8x8"}, {"--raw", "8x8", "a.png"}, {"--annotate", "o.png", "a.png", "b.png"},
            {"--360", "--rotation", "90", "a.png"}, {"--360", "--jvw", "f.jvw", "a.png"}, {"--tracker", "kf", "a.png"},
            {"--tracker", "pf", "--raw", "8x8", "--scaled"}}) {
     EXPECT_THROW(parseOptions(args), UsageError) << ::testing::PrintToString(args);
@@ -163,14 +163,10 @@ TEST(OptionParsing, RefusesBadValuesAndContradictions) {
 
 TEST(FaceMapping, UndoesEachRotationAndMapsTheScaledSpanOntoTheImage) {
   const int w = 50, h = 30;
-  // The engine's clockwise turn of a pixel in the w x h frame.
-  auto turn = [&](Point p, int rotation) -> Point {
-    switch (rotation) {
-      case 90: return {h - 1 - p.y, p.x};
-      case 180: return {w - 1 - p.x, h - 1 - p.y};
-      case 270: return {p.y, w - 1 - p.x};
-      default: return p;
-    }
+  // The engine's clockwise turn of a pixel in the w x h frame, a quarter at a time.
+  auto turn = [&](Point p, int rotation) {
+    for (int fw = w, fh = h; rotation > 0; rotation -= 90, std::swap(fw, fh)) p = {fh - 1 - p.y, p.x};
+    return p;
   };
   for (int rot : {0, 90, 180, 270}) {
     // A box over pixels x 10..19, y 5..11 and an eye at (12, 7) in the frame as given.

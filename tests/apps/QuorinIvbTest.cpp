@@ -17,10 +17,6 @@ namespace {
 
 using Bytes = std::vector<uint8_t>;
 
-void writeFile(const std::string& path, const Bytes& bytes) {
-    sourcetree::writeText(path, std::string(bytes.begin(), bytes.end()));
-}
-
 TEST(QuorinIvb, DescribesTheSmallStreamExactly) {
     EXPECT_EQ(qivb::describe(ivbgolden::streamWithOneObject()),
               "{\n"
@@ -96,8 +92,9 @@ TEST(QuorinIvb, DamageIsRefusedWithItsPlace) {
 
 TEST(QuorinIvb, ExitCodes) {
     const std::string dir = sourcetree::scratchDir("quorin_ivb_cli");
-    writeFile(dir + "/good.ivb", ivbgolden::streamWithOneObject());
-    writeFile(dir + "/bad.ivb", patched(ivbgolden::compositeWithFloats(), 29, {0}));
+    for (const auto& [name, bytes] : {std::make_pair("good", ivbgolden::streamWithOneObject()),
+                                      std::make_pair("bad", patched(ivbgolden::compositeWithFloats(), 29, {0}))})
+        sourcetree::writeText(dir + "/" + name + ".ivb", std::string(bytes.begin(), bytes.end()));
     struct Run {
         std::string args;
         int status;
