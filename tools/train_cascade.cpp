@@ -11,10 +11,15 @@
 //       Boosts stages into WORK/cascade.txt (state) and WORK/model.bin (the
 //       engine payload), mining negatives with the engine's own search against
 //       the partial cascade. Resumes after the last finished stage.
-//   train_cascade measure --boxes TSV --negatives LIST [--model FILE] [--limit N]
+//   train_cascade measure --boxes TSV --negatives LIST [--model FILE] [--limit N] [--offset K]
 //       Faces found and false hits per face-free image through the public
 //       entries in modes 0, 1 and 2, the orientation search on turned photos,
 //       and features evaluated per window; --model serves FILE as "mdcb".
+//   train_cascade model   --cascade STATE --out FILE [--save STATE2]
+//                         [--first-stage-from STATE3] [--threshold I:V,...]
+//       Writes the engine payload of a saved state. --threshold sets the
+//       pass threshold of stage I (from 0) to V: trading a little recall
+//       for fewer features per window, measured with `measure`.
 //
 // Lists: the negatives list has one image path and "train" or "report" per
 // line (tab separated). Deterministic for a given --seed.
@@ -907,10 +912,13 @@ int commandMeasure(std::map<std::string, std::string> const& a)
             continue;
         (r.source == "dev" ? dev : report).push_back(r);
     }
-    // a fixed spread over the report people, one face per photo
+    // a fixed spread over the report people, one face per photo; --offset
+    // takes the faces between (a set for choosing settings, apart from the
+    // one the figures are reported on)
     std::vector<FaceRow> chosen;
     const size_t every = std::max<size_t>(1, report.size() / std::max<size_t>(1, limit));
-    for (size_t i = 0; i < report.size() && chosen.size() < limit; i += every)
+    const size_t offset = static_cast<size_t>(std::max(0, std::atoi(get(a, "--offset", "0").c_str()))) % every;
+    for (size_t i = offset; i < report.size() && chosen.size() < limit; i += every)
         chosen.push_back(report[i]);
     std::vector<Gray> photos;
     for (FaceRow const& r : chosen) {
@@ -1071,6 +1079,18 @@ int commandModel(std::map<std::string, std::string> const& a)
             return 1;
         }
         cascade.stages[0] = other.stages[0];
+    }
+    std::istringstream settings(get(a, "--threshold"));
+    for (std::string item; std::getline(settings, item, ',');) {
+        const std::string::size_type colon = item.find(':');
+        char* end = nullptr;
+        const long index = colon == std::string::npos ? -1 : std::strtol(item.c_str(), &end, 10);
+        if (index < 0 || static_cast<size_t>(index) >= cascade.stages.size() || end != item.c_str() + colon) {
+            std::cerr << "--threshold wants STAGE:VALUE with a stage below " << cascade.stages.size() << ": " << item
+                      << "\n";
+            return 1;
+        }
+        cascade.stages[static_cast<size_t>(index)].threshold = std::strtof(item.c_str() + colon + 1, nullptr);
     }
     if (!get(a, "--save").empty() && !cascade.save(get(a, "--save"))) {
         std::cerr << "cannot write " << get(a, "--save") << "\n";
