@@ -4,7 +4,7 @@
 // 640 and 1280 by default) and runs both in turn, our engine in mode 2; from a
 // raw gray clip (consecutive W*H frames, as ffmpeg writes them) it runs our
 // engine in tracking mode (1) frame after frame against OpenCV on every frame.
-// OpenCV uses the same frontal cascade, scaleFactor 1.25, minNeighbors 3 and the
+// OpenCV uses its own frontal cascade (ours is trained for our search grid), scaleFactor 1.25, minNeighbors 3 and the
 // smallest and largest face size our engine derives for the frame, on one
 // thread like ours. Prints a table: median ms per frame each, the ratio, faces
 // found by each and how many of ours overlap one of OpenCV's (IoU >= 0.3).
@@ -465,7 +465,7 @@ int main(int argc, char** argv) {
   std::printf(
       "\nours: libquorinapi through its C API, the whole pipeline (search, merge, post filter, landmarks);\n"
       "  it shrinks each frame to its work size first (long side <= 640 in mode 2, <= 320 in mode 1).\n"
-      "opencv: CascadeClassifier::detectMultiScale on the frame as given, same frontal cascade,\n"
+      "opencv: CascadeClassifier::detectMultiScale on the frame as given, its frontal cascade,\n"
       "  scaleFactor 1.25, minNeighbors 3, minSize = the smallest face our engine searches there; %d thread%s%s.\n"
       "photos: per photo the fastest of %d runs each, median over photos; video: every frame once, median.\n"
       "matched: our faces overlapping one of OpenCV's (IoU >= 0.3)%s.\n",
