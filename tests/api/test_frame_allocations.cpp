@@ -57,14 +57,25 @@ void* __wrap_realloc(void* pointer, std::size_t size) {
 void __wrap_free(void* pointer) { __real_free(pointer); }
 }
 
-// The standard library's array and nothrow forms end in these.
+// Every form is replaced: under ASan the array and nothrow forms are the
+// sanitizer's own, and a block they hand out must not reach our free.
 void* operator new(std::size_t size) {
     note(size);
     if (void* p = __real_malloc(size == 0 ? 1 : size)) return p;
     throw std::bad_alloc();
 }
+void* operator new[](std::size_t size) { return operator new(size); }
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
+    note(size);
+    return __real_malloc(size == 0 ? 1 : size);
+}
+void* operator new[](std::size_t size, const std::nothrow_t& tag) noexcept { return operator new(size, tag); }
 void operator delete(void* p) noexcept { __real_free(p); }
+void operator delete[](void* p) noexcept { __real_free(p); }
 void operator delete(void* p, std::size_t) noexcept { __real_free(p); }
+void operator delete[](void* p, std::size_t) noexcept { __real_free(p); }
+void operator delete(void* p, const std::nothrow_t&) noexcept { __real_free(p); }
+void operator delete[](void* p, const std::nothrow_t&) noexcept { __real_free(p); }
 
 namespace {
 
