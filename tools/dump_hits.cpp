@@ -14,9 +14,13 @@
 // too and at more sizes with a finer step, for hard negatives: the cascade
 // rarely fires on them at the detect entries' settings.
 //
+// With --turns, each face photo is also searched turned in the plane (variant
+// t30, t-30, ...; each teacher face keeps its size, centred where its centre
+// turned to), for the material of the roll categories.
+//
 // Output: FILE.tsv, one line per hit: image, variant (m = mirrored, r90 ...),
 // work long side, best IoU with a teacher face (-1 for images of negatives/),
-// score, left, top, right, bottom (in the variant's full-size frame);
+// score, left, top, right, bottom (in the variant's full-size frame), category;
 // and FILE.f32, the features of the same hits as little-endian float32 rows of
 // 945. Labelling (face, false hit, ambiguous) is left to the trainer, which
 // knows the split. Deterministic: no randomness is involved.
@@ -26,6 +30,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <iostream>
 #include <sstream>
 #include <string>
@@ -33,7 +38,10 @@
 
 #include "StbImageDecoder.h"
 
+#include "ImageTurn.h"
+#include "ModelPacking.h"
 #include "api/FrameOps.h"
+#include "core/ModelRegistry.h"
 #include "detector/CascadeDetector.h"
 #include "detector/WindowMerger.h"
 #include "image/IntegralImage.h"
@@ -44,9 +52,12 @@ namespace fs = std::filesystem;
 namespace {
 
 const char* kUsage =
-    "usage: dump_hits [--data DIR] [--out PREFIX]\n"
+    "usage: dump_hits [--data DIR] [--out PREFIX] [--model FILE] [--turns A,B,...]\n"
     "  --data DIR     data cache (default $QUORIN_DATA_DIR or ~/.cache/quorin)\n"
-    "  --out PREFIX   writes PREFIX.tsv and PREFIX.f32 (default DIR/labels/hits)\n";
+    "  --out PREFIX   writes PREFIX.tsv and PREFIX.f32 (default DIR/labels/hits)\n"
+    "  --model FILE   a cascade payload to search with instead of the built-in one\n"
+    "  --turns LIST   also search each face photo turned by these angles (degrees,\n"
+    "                 clockwise) about its centre, the teacher faces turned with it\n";
 
 struct Box {
     double left, top, right, bottom;
@@ -183,7 +194,7 @@ public:
                 features.write(reinterpret_cast<const char*>(values.data()),
                                static_cast<std::streamsize>(values.size() * sizeof(float)));
                 tsv << name << '\t' << variant << '\t' << mode.longSide << '\t' << best << '\t' << hit.score << '\t' << box.left << '\t'
-                    << box.top << '\t' << box.right << '\t' << box.bottom << '\n';
+                    << box.top << '\t' << box.right << '\t' << box.bottom << '\t' << hit.category << '\n';
                 ++hits;
             }
         }
@@ -207,15 +218,15 @@ int main(int argc, char** argv)
         data = env;
     else if (const char* home = std::getenv("HOME"))
         data = std::string(home) + "/.cache/quorin";
-    std::string out;
+    std::string out, model, turnList;
     for (int i = 1; i < argc; ++i) {
         const std::string a = argv[i];
         if (a == "--help" || a == "-h") {
             std::cout << kUsage;
             return 0;
         }
-        if ((a == "--data" || a == "--out") && i + 1 < argc) {
-            (a == "--data" ? data : out) = argv[++i];
+        if ((a == "--data" || a == "--out" || a == "--model" || a == "--turns") && i + 1 < argc) {
+            (a == "--data" ? data : a == "--out" ? out : a == "--model" ? model : turnList) = argv[++i];
             continue;
         }
         std::cerr << kUsage;
@@ -232,6 +243,22 @@ int main(int argc, char** argv)
     if (!tsv || !features) {
         std::cerr << "dump_hits: cannot write " << out << ".tsv/.f32\n";
         return 1;
+    }
+    std::vector<uint8_t> packed;
+    if (!model.empty()) {
+        std::ifstream in(model, std::ios::binary);
+        packed = packRawModel(std::vector<uint8_t>(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()));
+        if (packed.size() <= 4) {
+            std::cerr << "dump_hits: cannot read " << model << "\n";
+            return 1;
+        }
+        ModelRegistry::instance().registerModel("mdcb", packed.data(), packed.data() + packed.size());
+    }
+    std::vector<double> turns;
+    {
+        std::istringstream ts(turnList);
+        for (std::string item; std::getline(ts, item, ',');)
+            turns.push_back(std::atof(item.c_str()));
     }
     Miner miner(tsv, features);
     int images = 0, hits = 0;
@@ -255,6 +282,20 @@ int main(int argc, char** argv)
             flippedFaces.push_back({w - b.right, b.top, w - b.left, b.bottom});
         const Frame m = mirrored(gray, w, h);
         hits += miner.mine(entry.image, "m", m.pixels.data(), w, h, flippedFaces, faceFree, kModes);
+        for (double t : faceFree ? std::vector<double>{} : turns) {
+            Frame f{std::vector<unsigned char>(static_cast<size_t>(w) * h), w, h};
+            turnAbout(gray, w, h, w / 2.0, h / 2.0, t, f.pixels.data());
+            std::vector<Box> moved;
+            for (Box const& b : entry.faces) {
+                double x = (b.left + b.right) / 2, y = (b.top + b.bottom) / 2;
+                turnPoint(w / 2.0, h / 2.0, t, x, y);
+                moved.push_back({x - (b.right - b.left) / 2, y - (b.bottom - b.top) / 2, x + (b.right - b.left) / 2,
+                                 y + (b.bottom - b.top) / 2});
+            }
+            std::ostringstream name;
+            name << 't' << t;
+            hits += miner.mine(entry.image, name.str(), f.pixels.data(), w, h, moved, false, kModes);
+        }
         if (faceFree) {
             hits += miner.mine(entry.image, "-", gray, w, h, {}, true, kNegativeModes);
             hits += miner.mine(entry.image, "m", m.pixels.data(), w, h, {}, true, kNegativeModes);

@@ -1,7 +1,7 @@
 // train_cascade: trains our frontal face cascade for the engine's search grid,
 // and measures it against the built-in one.
 //
-//   train_cascade boxes   --faces DIR --five TSV --dev DIR --split JSON --out TSV
+//   train_cascade boxes   --faces DIR --five TSV --dev DIR --split JSON --out TSV [--framing FILE]
 //       Face boxes in the built-in cascade's framing: runs that cascade (mode 2
 //       settings, merged hits) on the face photos, fits one mapping from five
 //       points to its boxes (one for human points, one for the teacher's), and
@@ -32,6 +32,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
+#include <functional>
 #include <iostream>
 #include <map>
 #include <memory>
@@ -43,7 +44,9 @@
 
 #include "StbImageDecoder.h"
 
+#include "BranchTrainer.h"
 #include "CascadeTrainer.h"
+#include "ImageTurn.h"
 #include "ModelPacking.h"
 #include "api/FrameOps.h"
 #include "core/ModelRegistry.h"
@@ -405,7 +408,17 @@ int commandBoxes(std::map<std::string, std::string> const& a)
         }
     }
     // fit on a sample of the many-identity photos where the built-in cascade finds the face
-    CascadeDetector cascade(R"({"model":"mdcb","imageMaxSize":640,"faceMinSize":32,"faceMaxSize":640})");
+    // the framing the post filter and the landmark net were trained on: the
+    // converted cascade's (--framing models/mdcb-converted.bin); without it the
+    // built-in cascade's
+    std::vector<uint8_t> framing;
+    if (!get(a, "--framing").empty()) {
+        std::ifstream in(get(a, "--framing"), std::ios::binary);
+        framing = packRawModel(std::vector<uint8_t>(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()));
+        ModelRegistry::instance().registerModel("framing", framing.data(), framing.data() + framing.size());
+    }
+    CascadeDetector cascade(framing.empty() ? R"({"model":"mdcb","imageMaxSize":640,"faceMinSize":32,"faceMaxSize":640})"
+                                            : R"({"model":"framing","imageMaxSize":640,"faceMinSize":32,"faceMaxSize":640})");
     std::vector<std::pair<Five, Box>> pairsHuman, pairsTeacher;
     size_t tried = 0;
     for (size_t i = 0; i < items.size(); i += 3) {
@@ -442,11 +455,12 @@ int commandBoxes(std::map<std::string, std::string> const& a)
     std::fprintf(stderr, "boxes: teacher points: %zu pairs (%zu kept) p %.4f q %.4f r %.4f s %.4f\n",
                  pairsTeacher.size(), kt, mt.p, mt.q, mt.r, mt.s);
     std::ofstream o(out);
-    o << "# path\tidentity\tsplit\tsource\tcx\tcy\tside\n";
+    o << "# path\tidentity\tsplit\tsource\tcx\tcy\tside\troll\n";
     for (Item const& it : items) {
         const Box b = (it.humanPoints ? mh : mt).apply(it.five);
+        const double roll = std::atan2(it.five.y[1] - it.five.y[0], it.five.x[1] - it.five.x[0]) * 180.0 / 3.14159265358979;
         o << it.path << '\t' << it.identity << '\t' << it.split << '\t' << it.source << '\t' << b.cx << '\t' << b.cy
-          << '\t' << b.side << '\n';
+          << '\t' << b.side << '\t' << roll << '\n';
     }
     std::fprintf(stderr, "boxes: %zu faces -> %s\n", items.size(), out.c_str());
     return 0;
@@ -455,6 +469,7 @@ int commandBoxes(std::map<std::string, std::string> const& a)
 struct FaceRow {
     std::string path, identity, split, source;
     Box box;
+    double roll = 0; // of the labelled eye line, degrees
 };
 
 std::vector<FaceRow> readBoxes(std::string const& path)
@@ -472,8 +487,11 @@ std::vector<FaceRow> readBoxes(std::string const& path)
         std::getline(ls, r.split, '\t');
         std::getline(ls, r.source, '\t');
         ls >> r.box.cx >> r.box.cy >> r.box.side;
-        if (ls)
-            rows.push_back(r);
+        if (!ls)
+            continue;
+        if (!(ls >> r.roll))
+            r.roll = 0;
+        rows.push_back(r);
     }
     return rows;
 }
@@ -563,6 +581,9 @@ struct Miner {
     int faceShare = 30; // percent of the variants cut from face photos (misframed and turned faces)
     std::vector<Box> faceBoxes;
     std::string modelName = "cascade_in_training";
+    // Which hits to keep and how: -1 drops it, 0 cuts it as it is, 1 mirrored
+    // (a branch learns from its mirror branch's hits too). Unset keeps all.
+    std::function<int(ScoredWindow const&)> pick;
 
     // Raw hits of the engine's search with the partial cascade on random
     // variants of the images (size, step, turn, mirror), cut into samples.
@@ -649,8 +670,9 @@ struct Miner {
                             if (overlap <= 0.0 || (v.quarters == 0 && overlap >= 0.4))
                                 continue;
                         }
+                        const int how = pick ? pick(hits[k]) : 0;
                         float inv = 0;
-                        if (sampleOf(image, g, w.left, w.top, w.right - w.left, false, patch, &inv))
+                        if (how >= 0 && sampleOf(image, g, w.left, w.top, w.right - w.left, how == 1, patch, &inv))
                             found[b].add(patch, inv);
                     }
                 }
@@ -855,9 +877,34 @@ void searchCost(CascadeDetector& d, Gray const& frame, int longSide, float step,
     whole.bottom = H;
     std::vector<ScoredWindow> unused;
     d.exhaustiveDetect(image, {whole}, &unused); // prepares the offsets
-    std::vector<int> costOf(d.commonStages.size() + 1, 0);
-    for (size_t i = 0; i < d.commonStages.size(); ++i)
-        costOf[i + 1] = costOf[i] + (d.commonFeatures[0][i].kind != WindowFeature::EMPTY ? 1 : 0);
+    // features evaluated by one classification, replayed stage by stage (a
+    // rejection inside a branch reports only that it happened in a branch)
+    auto featuresOf = [&](DetectionWindow const& win, int scale) {
+        const float inv = image.ComputeNorm(win);
+        float scores[15] = {};
+        int n = 0;
+        for (size_t i = 0; i < d.commonStages.size(); ++i) {
+            WindowFeature const& f = d.commonFeatures[static_cast<size_t>(scale)][i];
+            n += f.kind != WindowFeature::EMPTY ? 1 : 0;
+            if (d.commonStages[i].UpdateScoreAndThreshold(f.Eval(image, inv, win.left, win.top), scores))
+                return std::make_pair(n, static_cast<int>(i));
+        }
+        if (d.branchStages.size() < 2)
+            return std::make_pair(n, -1);
+        int best = 0;
+        for (int b = 0; b < static_cast<int>(d.branchStages.size()) && b < 15; ++b)
+            if (scores[b] > scores[best])
+                best = b;
+        scores[0] = scores[best];
+        auto const& stages = d.branchStages[static_cast<size_t>(best)];
+        for (size_t j = 0; j < stages.size(); ++j) {
+            WindowFeature const& f = d.branchFeatures[static_cast<size_t>(scale)][static_cast<size_t>(best)][j];
+            n += f.kind != WindowFeature::EMPTY ? 1 : 0;
+            if (stages[j].UpdateScoreAndThreshold(f.Eval(image, inv, win.left, win.top), scores))
+                return std::make_pair(n, static_cast<int>(d.commonStages.size()));
+        }
+        return std::make_pair(n, -1);
+    };
     const double lf = std::log(1.25);
     const int limit = std::min({static_cast<int>(std::log(W / 24.0) / lf), static_cast<int>(std::log(H / 24.0) / lf), 16});
     const int minScale = std::max(0, static_cast<int>(std::ceil(std::log(std::max(32, minSide / 8) / 24.0) / lf)));
@@ -878,11 +925,11 @@ void searchCost(CascadeDetector& d, Gray const& frame, int longSide, float step,
                 win.top = y;
                 win.right = x + w;
                 win.bottom = y + w;
-                float score = 0, cats[15];
-                int stage = 0;
-                const bool ok = d.classify(image, win, s, 0.0f, CascadeDetector::CLASSIFY_PLAIN, &score, cats, &stage);
+                const std::pair<int, int> r = featuresOf(win, s);
                 cost.classified += 1;
-                cost.features += ok ? costOf.back() : costOf[static_cast<size_t>(stage) + 1];
+                cost.features += r.first;
+                const bool ok = r.second < 0;
+                const int stage = r.second;
                 if (!ok && stage <= 9) {
                     skip[c] = 1;
                     skip[c + 1] = 1;
@@ -939,7 +986,8 @@ int commandMeasure(std::map<std::string, std::string> const& a)
                 return true;
         return false;
     };
-    for (int mode = 0; mode <= 2; ++mode) {
+    const bool costOnly = get(a, "--cost-only") == "1";
+    for (int mode = 0; mode <= 2 && !costOnly; ++mode) {
         int hits = 0;
         size_t falseHits = 0;
         quorin_init();
@@ -987,7 +1035,7 @@ int commandMeasure(std::map<std::string, std::string> const& a)
                     static_cast<double>(falseHits) / std::max<size_t>(1, freeImages.size()));
     }
     // orientation search on turned photos (a fresh session each, one call)
-    const size_t turns = std::min<size_t>(photos.size(), 150);
+    const size_t turns = costOnly ? 0 : std::min<size_t>(photos.size(), 150);
     for (int q = 0; q < 4; ++q) {
         std::map<int, int> orientations;
         for (size_t i = 0; i < turns; ++i) {
@@ -1007,6 +1055,8 @@ int commandMeasure(std::map<std::string, std::string> const& a)
     }
     // development report split: teacher faces in our framing, found in mode 2 and 0
     for (int mode : {0, 2}) {
+        if (costOnly)
+            break;
         quorin_init();
         quorin_setDetectionMode(static_cast<unsigned>(mode));
         int hits = 0;
@@ -1057,7 +1107,426 @@ int commandMeasure(std::map<std::string, std::string> const& a)
     return 0;
 }
 
-const char* kUsage = "usage: train_cascade boxes|train|measure|model [--key value ...] (see the comment at the top)\n";
+// ------------------------------------------------------------------ roll branches
+
+// The photo turned by `degrees` about (cx, cy) (see ImageTurn.h).
+Gray rotatedAbout(Gray const& in, double cx, double cy, double degrees)
+{
+    if (degrees == 0.0)
+        return in;
+    Gray out = in;
+    turnAbout(in.pixels.data(), in.width, in.height, cx, cy, degrees, out.pixels.data());
+    return out;
+}
+
+// Turned positives: each face photo turned about its box centre by a roll drawn
+// from [lo, hi] (the box stays where it is: the engine reports the axis-aligned
+// square of a turned face, centred as the upright one), jittered on the grid as
+// the upright positives are. `mirrorOut`, if given, gets every patch mirrored
+// (the same face with the opposite roll).
+void turnedSamples(std::vector<FaceRow> const& rows, TrainConfig const& cfg, double lo, double hi, uint64_t seed,
+                   SampleSet& out, SampleSet* mirrorOut)
+{
+    std::mt19937_64 rng(seed);
+    std::uniform_real_distribution<double> u(-1.0, 1.0), roll(lo, hi);
+    uint8_t patch[kPatch * kPatch], flipped[kPatch * kPatch];
+    for (FaceRow const& r : rows) {
+        Gray photo;
+        if (!loadGray(r.path, photo))
+            continue;
+        for (int c = 0; c < cfg.copies; ++c) {
+            // a mirrored copy turned the other way has the same roll
+            const bool mirror = c % 2 == 1;
+            const double theta = roll(rng);
+            const Gray g = rotatedAbout(photo, r.box.cx, r.box.cy, mirror ? -theta : theta);
+            IN_IMAGE image;
+            if (!image.Init(g.width, g.height, g.width, g.pixels.data()))
+                continue;
+            const double side = r.box.side * std::pow(cfg.scaleStep, 0.5 * u(rng));
+            const double dx = 0.5 * cfg.step * side * u(rng), dy = 0.5 * cfg.step * side * u(rng);
+            float inv = 0;
+            if (!sampleOf(image, g, r.box.cx + dx - side / 2, r.box.cy + dy - side / 2, side, mirror, patch, &inv))
+                continue;
+            out.add(patch, inv);
+            if (mirrorOut != nullptr) {
+                for (int y = 0; y < kPatch; ++y)
+                    for (int x = 0; x < kPatch; ++x)
+                        flipped[y * kPatch + x] = patch[y * kPatch + kPatch - 1 - x];
+                mirrorOut->add(flipped, inv);
+            }
+        }
+    }
+}
+
+// Sample i of a set, mirrored left-right, added to `out` (the patch comes back
+// exactly from its integral).
+void addMirrored(SampleSet const& set, size_t i, SampleSet& out)
+{
+    const uint32_t* ii = set.integral(i);
+    uint8_t patch[kPatch * kPatch];
+    for (int y = 0; y < kPatch; ++y)
+        for (int x = 0; x < kPatch; ++x)
+            patch[y * kPatch + (kPatch - 1 - x)] = static_cast<uint8_t>(
+                ii[(y + 1) * kStride + x + 1] - ii[y * kStride + x + 1] - ii[(y + 1) * kStride + x] + ii[y * kStride + x]);
+    out.add(patch, set.inverseDeviation(i));
+}
+
+int commandJointTrain(std::map<std::string, std::string> const& a)
+{
+    TrainConfig cfg;
+    const std::string work = get(a, "--work");
+    const int commonStages = std::atoi(get(a, "--common-stages", "3").c_str());
+    const int branchStages = std::atoi(get(a, "--branch-stages", "16").c_str());
+    cfg.negatives = std::atoi(get(a, "--negatives-per-stage", "4000").c_str());
+    cfg.seed = std::strtoull(get(a, "--seed", "29").c_str(), nullptr, 10);
+    const double minutes = std::atof(get(a, "--minutes", "1e9").c_str());
+    const double hitRate = std::atof(get(a, "--hit-rate", "0.995").c_str());
+    const double firstHitRate = std::atof(get(a, "--first-hit-rate", "0.997").c_str());
+    const double uprightRoll = std::atof(get(a, "--upright-roll", "10").c_str());
+    const double uprightRouting = std::atof(get(a, "--upright-routing", "0.98").c_str());
+    const int faceShare = std::clamp(std::atoi(get(a, "--face-share", "40").c_str()), 0, 100);
+    double bandLo = 12, bandHi = 50;
+    std::sscanf(get(a, "--band", "12:50").c_str(), "%lf:%lf", &bandLo, &bandHi);
+    const auto start = std::chrono::steady_clock::now();
+    auto elapsed = [&] { return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count(); };
+    std::FILE* log = std::fopen((work + "/train.log").c_str(), "a");
+    auto say = [&](const char* fmt, auto... v) {
+        for (std::FILE* f : {stderr, log}) {
+            if (f == nullptr)
+                continue;
+            std::fprintf(f, "[%7.1fs] ", elapsed());
+            std::fprintf(f, fmt, v...);
+            std::fprintf(f, "\n");
+            std::fflush(f);
+        }
+    };
+    JointCascade jc;
+    if (jc.load(work + "/joint.txt"))
+        say("resuming: %zu common stages, branch stages %zu / %zu", jc.common.size(),
+            jc.branch.size() > 0 ? jc.branch[0].size() : size_t{0}, jc.branch.size() > 1 ? jc.branch[1].size() : size_t{0});
+    jc.branch.resize(2);
+    std::vector<FaceRow> train;
+    for (FaceRow const& r : readBoxes(get(a, "--boxes")))
+        if (r.split == "train")
+            train.push_back(r);
+    const size_t maxFaces = static_cast<size_t>(std::atoi(get(a, "--faces", "4000").c_str()));
+    if (train.size() > maxFaces) {
+        std::vector<FaceRow> spread;
+        for (size_t i = 0; i < maxFaces; ++i)
+            spread.push_back(train[i * train.size() / maxFaces]);
+        train.swap(spread);
+    }
+    Miner miner;
+    for (auto const& [path, split] : readList(get(a, "--negatives"))) {
+        Gray g;
+        if (split == "train" && loadGray(path, g))
+            miner.images.push_back(shrunk(g, 1024));
+    }
+    {
+        // face photos turned by any roll of the range: parts of turned faces,
+        // and faces framed wrongly, are the hard negatives
+        std::mt19937_64 rng(cfg.seed + 5);
+        std::uniform_real_distribution<double> roll(-bandHi, bandHi);
+        for (size_t i = 0; i < train.size() && miner.facePhotos.size() < 1500; i += 2) {
+            Gray g;
+            if (train[i].source != "dev" && loadGray(train[i].path, g)) {
+                miner.facePhotos.push_back(rotatedAbout(g, train[i].box.cx, train[i].box.cy, roll(rng)));
+                miner.faceBoxes.push_back(train[i].box);
+            }
+        }
+    }
+    SampleSet upright, right, left;
+    turnedSamples(train, cfg, -uprightRoll, uprightRoll, cfg.seed, upright, nullptr);
+    turnedSamples(train, cfg, bandLo, bandHi, cfg.seed + 1, right, &left);
+    say("%zu faces; positives: upright %zu, turned %zu + %zu mirrored; %zu face-free images, %zu turned face photos",
+        train.size(), upright.size(), right.size(), left.size(), miner.images.size(), miner.facePhotos.size());
+    FeaturePool pool(2, 2, 0.25f, 1.25f);
+    const std::vector<SampleSet const*> positives{&upright, &right, &left};
+    const size_t K = 3;
+    auto save = [&] {
+        jc.save(work + "/joint.txt");
+        CascadeWriter::writeFile(work + "/model.bin", jc.toModel());
+    };
+    auto timeUp = [&] { return elapsed() > minutes * 60; };
+
+    while (static_cast<int>(jc.common.size()) < commonStages && !timeUp()) {
+        const size_t k = jc.common.size();
+        SampleSet neg;
+        size_t searched = 0;
+        miner.faceShare = k == 0 ? 0 : faceShare;
+        miner.pick = nullptr;
+        const size_t variants = miner.mine(CascadeWriter::toBytes(jc.toModel()), static_cast<size_t>(cfg.negatives),
+                                           cfg.seed * 1000003u + k, cfg.threads, neg, &searched);
+        std::vector<SampleSet> pos(K);
+        std::vector<std::vector<char>> alive(K, std::vector<char>(neg.size(), 0));
+        float F[15];
+        bool ok[15];
+        for (size_t c = 0; c < K; ++c)
+            for (size_t i = 0; i < positives[c]->size(); ++i) {
+                jc.commonSums(positives[c]->integral(i), positives[c]->inverseDeviation(i), F, ok);
+                if (ok[c])
+                    pos[c].addFrom(*positives[c], i);
+            }
+        for (size_t i = 0; i < neg.size(); ++i) {
+            jc.commonSums(neg.integral(i), neg.inverseDeviation(i), F, ok);
+            for (size_t c = 0; c < K; ++c)
+                alive[c][i] = ok[c];
+        }
+        say("common stage %zu: positives %zu / %zu / %zu, %zu negatives from %zu variants (%zu accepted windows seen)", k,
+            pos[0].size(), pos[1].size(), pos[2].size(), neg.size(), variants, searched);
+        std::vector<JointClass> classes;
+        for (size_t c = 0; c < K; ++c)
+            classes.push_back({&pos[c], {&neg}});
+        StageOptions o;
+        o.seed = cfg.seed * 7919u + k;
+        o.threads = cfg.threads;
+        o.featureFraction = k == 0 ? 0.05 : 0.03;
+        // rejections within the first ten engine stages let the search skip the neighbours
+        o.maxStumps = k == 0 ? 9 : std::min(120, 12 + 10 * static_cast<int>(k));
+        o.minStumps = k == 0 ? 2 : 3;
+        o.minHitRate = k == 0 ? firstHitRate : hitRate;
+        o.maxFalseRate = 0.5;
+        const JointCascade* prior = &jc;
+        JointReport rep;
+        JointStage st = trainSoftStage(
+            pool, classes, [prior](const uint32_t* ii, float inv, float* sums) {
+                bool al[15];
+                prior->commonSums(ii, inv, sums, al);
+            },
+            neg, alive, o, &rep);
+        jc.common.push_back(std::move(st));
+        jc.branch.assign(2, {});
+        jc.uprightBias = 0;
+        save();
+        say("common stage %zu done: %d stumps, hit %.4f / %.4f / %.4f, background passing %.4f", k, rep.stumps,
+            rep.hitRate[0], rep.hitRate[1], rep.hitRate[2], rep.falseRate);
+    }
+    if (static_cast<int>(jc.common.size()) < commonStages)
+        return 0;
+    if (jc.uprightBias == 0.0f) {
+        // the bias that sends the asked share of the upright faces upright
+        std::vector<float> need;
+        float F[15];
+        bool ok[15];
+        for (size_t i = 0; i < upright.size(); ++i) {
+            jc.commonSums(upright.integral(i), upright.inverseDeviation(i), F, ok);
+            if (!ok[0])
+                continue;
+            float other = -1e30f;
+            for (size_t c = 1; c < K; ++c)
+                if (ok[c])
+                    other = std::max(other, jc.margin(static_cast<int>(c), F[c]));
+            need.push_back(std::max(0.0f, other - jc.margin(0, F[0])));
+        }
+        std::sort(need.begin(), need.end());
+        if (!need.empty())
+            jc.uprightBias = need[std::min(need.size() - 1, static_cast<size_t>(uprightRouting * need.size()))] + 1e-3f;
+        save();
+    }
+    for (size_t c = 0; c < K; ++c) {
+        size_t counts[3] = {0, 0, 0}, dropped = 0;
+        for (size_t i = 0; i < positives[c]->size(); ++i) {
+            bool passes = false;
+            const int route = jc.route(positives[c]->integral(i), positives[c]->inverseDeviation(i), &passes);
+            passes ? ++counts[route] : ++dropped;
+        }
+        say("category %zu positives (upright bias %.3f): routed upright %zu, right %zu, left %zu, rejected %zu", c,
+            static_cast<double>(jc.uprightBias), counts[0], counts[1], counts[2], dropped);
+    }
+    // the branches, a stage of each in turn
+    for (int k = 0; k < branchStages && !timeUp(); ++k)
+        for (size_t b = 0; b < 2 && !timeUp(); ++b) {
+            if (static_cast<int>(jc.branch[b].size()) > k)
+                continue;
+            // every face the common stages send to this branch is its positive,
+            // whatever its roll (the counter-clockwise branch's faces mirrored)
+            SampleSet pos, neg, flipped;
+            for (SampleSet const* p : positives)
+                for (size_t i = 0; i < p->size(); ++i) {
+                    bool passes = false;
+                    const int route = jc.route(p->integral(i), p->inverseDeviation(i), &passes);
+                    if (!passes)
+                        continue;
+                    if (route == static_cast<int>(b)) {
+                        if (jc.branchPasses(b, p->integral(i), p->inverseDeviation(i)))
+                            pos.addFrom(*p, i);
+                    } else if (b == 1 && route == 2) {
+                        flipped.clear();
+                        addMirrored(*p, i, flipped);
+                        if (jc.branchPasses(b, flipped.integral(0), flipped.inverseDeviation(0)))
+                            pos.addFrom(flipped, 0);
+                    }
+                }
+            miner.faceShare = faceShare;
+            miner.pick = [b](ScoredWindow const& w) {
+                if (w.category == static_cast<int>(b))
+                    return 0;
+                return b == 1 && w.category == 2 ? 1 : -1;
+            };
+            size_t searched = 0;
+            const size_t variants = miner.mine(CascadeWriter::toBytes(jc.toModel()), static_cast<size_t>(cfg.negatives),
+                                               cfg.seed * 1000003u + 1000 * (b + 1) + static_cast<size_t>(k), cfg.threads,
+                                               neg, &searched);
+            say("branch %zu stage %d: %zu positives, %zu negatives from %zu variants (%zu accepted windows seen)", b, k,
+                pos.size(), neg.size(), variants, searched);
+            if (neg.size() < 200) {
+                say("too few negatives left to mine in branch %zu", b);
+                continue;
+            }
+            StageOptions o;
+            o.seed = cfg.seed * 7919u + 100 * (b + 1) + static_cast<uint64_t>(k);
+            o.threads = cfg.threads;
+            o.featureFraction = k < 3 ? 0.03 : 0.015;
+            o.maxStumps = std::min(120, 12 + 10 * k);
+            o.minStumps = 3;
+            o.minHitRate = hitRate;
+            o.maxFalseRate = 0.5;
+            std::vector<JointStage> const* prior = &jc.branch[b];
+            JointReport rep;
+            JointStage st = trainSoftStage(
+                pool, {{&pos, {&neg}}}, [prior](const uint32_t* ii, float inv, float* sums) {
+                    sums[0] = 0.0f;
+                    for (JointStage const& s : *prior)
+                        sums[0] += s.sums(ii, inv)[0];
+                },
+                neg, {}, o, &rep);
+            jc.branch[b].push_back(std::move(st));
+            save();
+            say("branch %zu stage %d done: %d stumps, hit %.4f, false %.4f, median margin %.3f", b, k, rep.stumps,
+                rep.hitRate[0], rep.falseRate, static_cast<double>(jc.branch[b].back().medianMargin));
+        }
+    if (log != nullptr)
+        std::fclose(log);
+    return 0;
+}
+
+int commandJointModel(std::map<std::string, std::string> const& a)
+{
+    JointCascade jc;
+    if (!jc.load(get(a, "--work") + "/joint.txt")) {
+        std::cerr << "cannot read " << get(a, "--work") << "/joint.txt\n";
+        return 1;
+    }
+    const int stages = std::atoi(get(a, "--branch-stages", "-1").c_str());
+    for (std::vector<JointStage>& b : jc.branch)
+        if (stages >= 0 && static_cast<size_t>(stages) < b.size())
+            b.resize(static_cast<size_t>(stages));
+    if (!get(a, "--bias").empty())
+        jc.uprightBias = std::strtof(get(a, "--bias").c_str(), nullptr);
+    return CascadeWriter::writeFile(get(a, "--out"), jc.toModel()) ? 0 : 1;
+}
+
+// Faces found and roll error on report photos turned about the face's centre,
+// through quorin_detect in the given modes.
+int commandRollMeasure(std::map<std::string, std::string> const& a)
+{
+    std::vector<uint8_t> payload, packed;
+    const std::string model = get(a, "--model");
+    if (!model.empty()) {
+        std::ifstream in(model, std::ios::binary);
+        payload.assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+        if (payload.empty()) {
+            std::cerr << "roll-measure: cannot read " << model << "\n";
+            return 1;
+        }
+        packed = packRawModel(payload);
+        ModelRegistry::instance().registerModel("mdcb", packed.data(), packed.data() + packed.size());
+    }
+    const size_t limit = static_cast<size_t>(std::atoi(get(a, "--limit", "300").c_str()));
+    std::vector<FaceRow> report;
+    for (FaceRow const& r : readBoxes(get(a, "--boxes")))
+        if (r.split == "report" && r.source != "dev")
+            report.push_back(r);
+    std::vector<FaceRow> chosen;
+    const size_t every = std::max<size_t>(1, report.size() / std::max<size_t>(1, limit));
+    for (size_t i = 0; i < report.size() && chosen.size() < limit; i += every)
+        chosen.push_back(report[i]);
+    {
+        // raw hits of the cascade alone by category, on the first photos at 0 and +30 degrees
+        CascadeDetector d(R"({"model":"mdcb","imageMaxSize":1024,"faceMinSize":24,"faceMaxSize":1024})");
+        std::map<int, int> byCategory[2];
+        for (size_t i = 0; i < std::min<size_t>(chosen.size(), 20); ++i) {
+            Gray photo;
+            if (!loadGray(chosen[i].path, photo))
+                continue;
+            for (int t = 0; t < 2; ++t) {
+                const Gray g = rotatedAbout(photo, chosen[i].box.cx, chosen[i].box.cy, 30.0 * t);
+                IN_IMAGE image;
+                if (!image.Init(g.width, g.height, g.width, g.pixels.data()))
+                    continue;
+                d.setSearchStep(0.1f, 0.1f);
+                d.setFaceSizeRange(32, std::min(g.width, g.height));
+                DetectionWindow whole;
+                whole.left = 0;
+                whole.top = 0;
+                whole.right = g.width;
+                whole.bottom = g.height;
+                std::vector<ScoredWindow> hits;
+                d.exhaustiveDetect(image, {whole}, &hits);
+                for (ScoredWindow const& h : hits)
+                    ++byCategory[t][h.category];
+            }
+        }
+        for (int t = 0; t < 2; ++t) {
+            std::printf("raw cascade hits on 20 photos turned %d, by category:", 30 * t);
+            for (auto const& [c, n] : byCategory[t])
+                std::printf(" %d:%d", c, n);
+            std::printf(" (%zu common stages, %zu branches)\n", d.commonStages.size(), d.branchStages.size());
+        }
+    }
+    std::vector<int> angles;
+    std::istringstream as(get(a, "--angles", "0,15,30,45"));
+    for (std::string item; std::getline(as, item, ',');)
+        angles.push_back(std::atoi(item.c_str()));
+    std::istringstream ms(get(a, "--modes", "2,0"));
+    for (std::string item; std::getline(ms, item, ',');) {
+        const int mode = std::atoi(item.c_str());
+        quorin_init();
+        quorin_setDetectionMode(static_cast<unsigned>(mode));
+        for (int angle : angles) {
+            int found = 0, tried = 0;
+            double rollError = 0;
+            for (int sign : {1, -1}) {
+                if (angle == 0 && sign < 0)
+                    continue;
+                for (FaceRow const& r : chosen) {
+                    Gray photo;
+                    if (!loadGray(r.path, photo))
+                        continue;
+                    const Gray g = rotatedAbout(photo, r.box.cx, r.box.cy, sign * angle);
+                    std::vector<uint8_t> frame = g.pixels;
+                    std::vector<int> blocks(100 * kBlock, 0);
+                    const int n = quorin_detect(frame.data(), g.width, g.height, blocks.data(), 100, 0);
+                    ++tried;
+                    double bestIou = 0;
+                    int roll = 0;
+                    for (int k = 0; k < std::clamp(n, 0, 100); ++k) {
+                        const int* b = &blocks[static_cast<size_t>(k) * kBlock];
+                        const Box box{(b[5] + b[6]) / 2.0, (b[3] + b[4]) / 2.0, ((b[6] - b[5]) + (b[4] - b[3])) / 2.0};
+                        const double o = iou(box, r.box);
+                        if (o > bestIou) {
+                            bestIou = o;
+                            roll = b[0];
+                        }
+                    }
+                    if (bestIou >= 0.4) {
+                        ++found;
+                        rollError += std::abs(roll - (r.roll + sign * angle));
+                    }
+                }
+            }
+            std::printf("mode %d, turned %2d: found %d / %d (%.1f%%), mean roll error %.2f\n", mode, angle, found, tried,
+                        100.0 * found / std::max(1, tried), found > 0 ? rollError / found : 0.0);
+            std::fflush(stdout);
+        }
+        quorin_release();
+    }
+    if (!model.empty())
+        ModelRegistry::instance().unregisterModel("mdcb");
+    return 0;
+}
+
+const char* kUsage = "usage: train_cascade boxes|train|measure|model|joint-train|joint-model|roll-measure [--key value ...] (see the comment at the top)\n";
 
 } // namespace
 
@@ -1116,6 +1585,12 @@ int main(int argc, char** argv)
         return commandMeasure(a);
     if (cmd == "model")
         return commandModel(a);
+    if (cmd == "joint-train")
+        return commandJointTrain(a);
+    if (cmd == "joint-model")
+        return commandJointModel(a);
+    if (cmd == "roll-measure")
+        return commandRollMeasure(a);
     std::cerr << kUsage;
     return 2;
 }

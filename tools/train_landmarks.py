@@ -115,6 +115,24 @@ def plain_example(frames, s, side):
     return patch_input(frame, box, side), box, pts
 
 
+def turned_example(frames, s, side, angle):
+    """The plain example with the frame turned by `angle` degrees about the box
+    centre: the box stays (the detector reports the axis-aligned square of a
+    turned face, centred as the upright one), the points turn."""
+    frame, scale = frames.get(s['root'], s['image'], s['long'])
+    box = s['box'] * scale
+    cx, cy = (box[0] + box[2]) / 2, (box[1] + box[3]) / 2
+    m = cv2.getRotationMatrix2D((cx, cy), angle, 1.0)
+    img = cv2.warpAffine(frame, m, (frame.shape[1], frame.shape[0]), flags=cv2.INTER_LINEAR,
+                         borderMode=cv2.BORDER_REFLECT)
+    pts = np.hstack([s['pts'] * scale, np.ones((5, 1))]) @ m.T
+    box = np.round(box).astype(int)
+    box[[0, 1]] = np.maximum(box[[0, 1]], 0)
+    box[2] = min(box[2], img.shape[1])
+    box[3] = min(box[3], img.shape[0])
+    return patch_input(img, box, side), box, pts
+
+
 def person_of(image):
     """The identity of a many-identity photo: the LFW folder or the Congress id."""
     parts = image.split('/')
@@ -218,7 +236,7 @@ def move_teacher_points(samples, offset):
             s['pts'] = s['pts'] + offset.reshape(5, 2) * [w, h]
 
 
-def augmented_example(frames, s, side, rng):
+def augmented_example(frames, s, side, rng, roll_range=0.0):
     """A training draw: the face turned in the plane, the box moved and resized as
     the detector's box varies, mirrored, with other light, blur and noise."""
     frame, scale = frames.get(s['root'], s['image'], s['long'])
@@ -227,6 +245,9 @@ def augmented_example(frames, s, side, rng):
     cx, cy = (box[0] + box[2]) / 2, (box[1] + box[3]) / 2
     size = box[2] - box[0]
     angle = float(np.clip(rng.normal(0, 10), -30, 30))
+    if roll_range > 0 and rng.random() < 0.5:
+        # half the draws over the whole roll range the cascade's branches find
+        angle = float(rng.uniform(-roll_range, roll_range))
     m = cv2.getRotationMatrix2D((cx, cy), angle, 1.0)
     img = cv2.warpAffine(frame, m, (frame.shape[1], frame.shape[0]), flags=cv2.INTER_LINEAR,
                          borderMode=cv2.BORDER_REFLECT)
@@ -271,14 +292,14 @@ def point_errors(pred_rel, box, pts):
     return np.linalg.norm(p - pts, axis=1).mean() / iod, min(d, 360 - d)
 
 
-def build_training_set(train, frames, side, draws, rng):
+def build_training_set(train, frames, side, draws, rng, roll_range=0.0):
     xs, ys = [], []
     for s in train:  # every plain sample once, then augmented draws
         x, box, pts = plain_example(frames, s, side)
         xs.append(x)
         ys.append(relative(pts, box))
         for _ in range(draws):
-            e = augmented_example(frames, s, side, rng)
+            e = augmented_example(frames, s, side, rng, roll_range)
             if e is not None:
                 xs.append(e[0])
                 ys.append(relative(e[2], e[1]))
@@ -330,7 +351,7 @@ def train_net(model, U, Y, args, work):
 
 def run_tag(args):
     keys = ('side', 'hidden', 'draws', 'epochs', 'seed', 'decay', 'lr', 'batch', 'sources', 'spread',
-            'teacher_offset', 'limit')
+            'teacher_offset', 'limit', 'roll_range')
     return json.dumps({k: getattr(args, k) for k in keys})
 
 
@@ -359,12 +380,17 @@ def main(argv=None):
                     help='move teacher points by the mean human-minus-teacher offset (1) or not (0)')
     ap.add_argument('--limit', type=int, default=0, help='train on at most this many faces (for the data curve)')
     ap.add_argument('--report', default=None, help='write the figures as JSON to this file')
+    ap.add_argument('--roll-range', type=float, default=0.0,
+                    help='half the augmented draws turn the face uniformly within +-this many degrees '
+                         '(0: all turns drawn around upright)')
     args = ap.parse_args(argv)
     args.faces = args.faces or os.path.join(args.data, 'faces-data')
     args.work = args.work or os.path.join(args.data, 'lm-work')
     args.hidden = [int(v) for v in str(args.hidden).split(',') if v]
     args.sources = sorted(set(args.sources.split(',')))
     tag = '%s-s%d-d%d-l%d-t%d' % ('+'.join(args.sources), args.side, args.draws, args.limit, args.teacher_offset)
+    if args.roll_range:
+        tag += '-r%g' % args.roll_range
     args.work = os.path.join(args.work, tag + '-' + '-'.join(map(str, args.hidden)))
     os.makedirs(args.work, exist_ok=True)
     torch.manual_seed(args.seed)
@@ -399,7 +425,7 @@ def main(argv=None):
         X, Y = z['X'], z['Y']
     else:
         t0 = time.time()
-        X, Y = build_training_set(train, frames, args.side, args.draws, rng)
+        X, Y = build_training_set(train, frames, args.side, args.draws, rng, args.roll_range)
         np.savez(cache + '.tmp.npz', X=X, Y=Y)
         os.replace(cache + '.tmp.npz', cache)
         print('built %d samples from %d faces of %d people in %.0f s' % (len(X), len(train),
@@ -420,13 +446,15 @@ def main(argv=None):
     low = float((((X - mean) / (args.spread * std)) < -1).mean())
     mean_shape = np.array([relative(s['pts'], s['box']) for s in train]).mean(0)
 
-    def evaluate(subset, check=0):
+    def evaluate(subset, check=0, turn=0):
         """NME and roll error of the integer net and of the mean shape; the first
         `check` faces also run through the reference integer pass, which must agree
         with the vectorised one exactly."""
         xs, boxes = [], []
-        for s in subset:
-            x, box, pts = plain_example(frames, s, args.side)
+        for k, s in enumerate(subset):
+            # turned faces alternate the direction
+            x, box, pts = (turned_example(frames, s, args.side, turn if k % 2 == 0 else -turn) if turn
+                           else plain_example(frames, s, args.side))
             xs.append(x)
             boxes.append((box, pts))
         out = nw.dense_run_batch(net, np.array(xs, np.int64))
@@ -443,6 +471,9 @@ def main(argv=None):
     report_teacher = [s for s in many if s['split'] == 'report' and not s['human'] and s['central']]
     groups = [('train (human points)', [s for s in train if s.get('human')][:2000], 20),
               ('report, human points', report_human, 50),
+              ('report, human points, turned 15', report_human, 0, 15),
+              ('report, human points, turned 30', report_human, 0, 30),
+              ('report, human points, turned 45', report_human, 0, 45),
               ('report, teacher points (central faces)', report_teacher, 0),
               ('development report split', [s for s in dev if s['split'] == 'report'], 0)]
     figures = {'args': vars(args), 'scales': scales, 'inputs_below_minus_one': low}
@@ -450,10 +481,10 @@ def main(argv=None):
           % (tag, args.side, args.side, args.hidden, scales, 100 * low))
     print('| split | faces | NME net | NME mean shape | roll error net | roll error mean shape |')
     print('|---|---|---|---|---|---|')
-    for name, subset, check in groups:
+    for name, subset, check, *turn in groups:
         if not subset:
             continue
-        f = evaluate(subset, check)
+        f = evaluate(subset, check, turn[0] if turn else 0)
         figures[name] = f
         print('| %s | %d | %.4f | %.4f | %.2f | %.2f |' % (name, f['faces'], f['nme'], f['nme_mean_shape'],
                                                           f['roll'], f['roll_mean_shape']), flush=True)

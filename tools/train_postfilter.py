@@ -12,8 +12,9 @@ left out. Only the "train" split is trained on; the figures are reported on "rep
 Model: a linear term on the standardised feature, fitted by L2-regularised logistic
 regression (Newton steps, class-balanced weights), then folded back onto the raw feature
 and quantised to the format's int16 blocks. The bias is set so that at least --keep of the
-training faces pass. All 15 categories carry the same model (a single-branch cascade only
-ever reports category 0). Deterministic: no randomness is involved.
+training faces pass. With --categories N each of the first N cascade categories gets a model
+fitted on its own hits (the roll branches see turned faces), the others take category 0's;
+by default all 15 carry the same model. Deterministic: no randomness is involved.
 """
 import argparse
 import json
@@ -115,6 +116,32 @@ def decisions(category, feats):
     return (feats[:, 0] >= FAST_PASS) | (scores > 0), scores
 
 
+def fit_category(feats, labels, args):
+    """One category's model: the linear term on the standardised feature, folded
+    back onto the raw one, with the bias that keeps --keep of its training faces
+    that the fast pass doesn't already let through."""
+    x = feats.astype(np.float64)
+    mu, sigma = x.mean(0), x.std(0)
+    sigma[sigma < 1e-6] = 1.0  # bins that never fire get no weight anyway
+    w, b = fit_logistic((x - mu) / sigma, labels.astype(np.float64), args.l2)
+    raw_w = w / sigma
+    margin = x @ raw_w + (b - mu @ raw_w)
+    judged = (labels == 1) & (feats[:, 0] < FAST_PASS)
+    pos_margin = np.sort(margin[judged])
+    cut = pos_margin[int(np.floor((1.0 - args.keep) * len(pos_margin)))] if len(pos_margin) else 0.0
+    shift = (b - mu @ raw_w) - cut + 1e-3  # faces at the cut stay strictly above 0
+    return (raw_w, np.zeros(0), np.zeros((0, DIM)), np.zeros((0, DIM)), -shift)
+
+
+def decide(models, cats, feats):
+    """Per hit, the decision of its category's model."""
+    passed = np.zeros(len(feats), bool)
+    for k in np.unique(cats):
+        m = cats == k
+        passed[m] = decisions(models[min(int(k), len(models) - 1)], feats[m])[0]
+    return passed
+
+
 def main(argv=None):
     ap = argparse.ArgumentParser(description=__doc__.splitlines()[0],
                                  epilog='Defaults reproduce models/mdpb.bin from the mined hits.')
@@ -128,6 +155,9 @@ def main(argv=None):
                     help='payload whose figures are printed beside the new one (read before writing --out)')
     ap.add_argument('--l2', type=float, default=100.0, help='ridge weight on the standardised feature')
     ap.add_argument('--keep', type=float, default=0.999, help='share of training faces the bias keeps')
+    ap.add_argument('--categories', type=int, default=1,
+                    help='cascade categories with a model of their own (the hits\' last column); '
+                         'the others take category 0\'s')
     args = ap.parse_args(argv)
 
     split = json.load(open(args.split))
@@ -146,29 +176,29 @@ def main(argv=None):
     if train.sum() == 0 or labels[train].min() == labels[train].max():
         raise SystemExit('no usable training hits')
 
-    x = feats[train].astype(np.float64)
-    mu, sigma = x.mean(0), x.std(0)
-    sigma[sigma < 1e-6] = 1.0  # bins that never fire get no weight anyway
-    w, b = fit_logistic((x - mu) / sigma, labels[train].astype(np.float64), args.l2)
-    raw_w = w / sigma
-    margin = x @ raw_w + (b - mu @ raw_w)
-
-    # The bias: the largest that still keeps the wanted share of training faces
-    # that the fast pass doesn't already let through.
-    judged = labels[train] == 1
-    judged &= feats[train][:, 0] < FAST_PASS
-    pos_margin = np.sort(margin[judged])
-    cut = pos_margin[int(np.floor((1.0 - args.keep) * len(pos_margin)))] if len(pos_margin) else 0.0
-    shift = (b - mu @ raw_w) - cut + 1e-3  # faces at the cut stay strictly above 0
-
-    category = (raw_w, np.zeros(0), np.zeros((0, DIM)), np.zeros((0, DIM)), -shift)
-    payload = ilabs.write_ilabs([category] * ilabs.CATEGORY_NUMBER)
-    quantised = ilabs.read_ilabs(payload)[0]
+    cats = np.array([int(r[9]) if len(r) > 9 else 0 for r in rows])
+    cats[cats >= args.categories] = 0
+    models = []
+    for k in range(args.categories):
+        m = train & (cats == k)
+        if k > 0 and (labels[m].min(initial=1) == labels[m].max(initial=0)):
+            print('category %d: too few hits of both kinds, it takes category 0\'s model' % k)
+            models.append(models[0])
+            continue
+        models.append(fit_category(feats[m], labels[m], args))
+    payload = ilabs.write_ilabs(models + [models[0]] * (ilabs.CATEGORY_NUMBER - len(models)))
+    quantised_all = ilabs.read_ilabs(payload)
+    quantised = quantised_all[0]
     with open(args.out, 'wb') as f:
         f.write(payload)
 
-    print('%s: %d bytes, linear term only, l2 %g, training faces kept >= %.1f%%'
-          % (os.path.normpath(args.out), len(payload), args.l2, 100 * args.keep))
+    print('%s: %d bytes, linear term only, %d categories, l2 %g, training faces kept >= %.1f%%'
+          % (os.path.normpath(args.out), len(payload), args.categories, args.l2, 100 * args.keep))
+    for k in range(args.categories):
+        mk = cats == k
+        print('  category %d: %d face hits, %d false hits (train %d / %d)' % (
+            k, (labels[mk] == 1).sum(), (labels[mk] == 0).sum(), (labels[mk & train] == 1).sum(),
+            (labels[mk & train] == 0).sum()))
     print('| split | faces | false hits | faces kept | false hits removed | before: kept | before: removed |')
     print('|---|---|---|---|---|---|---|')
     plain = np.array([r[1] == '-' for r in rows])
@@ -179,11 +209,11 @@ def main(argv=None):
                     ('report, many-identity photos', (sets == 'report') & ~dev)):
         pos, neg = labels[m] == 1, labels[m] == 0
         cells = []
-        for model in (quantised, before):
+        for model in (quantised_all, before):
             if model is None:
                 cells += ['-', '-']
                 continue
-            passed, _ = decisions(model, feats[m])
+            passed = decide(model if isinstance(model, list) else [model], cats[m], feats[m])
             kept = passed[pos].mean() if pos.any() else float('nan')
             removed = 1.0 - passed[neg].mean() if neg.any() else float('nan')
             cells += ['%.1f%% (%d)' % (100 * kept, passed[pos].sum()), '%.1f%% (%d)' % (100 * removed, (~passed[neg]).sum())]
@@ -191,7 +221,7 @@ def main(argv=None):
     print('(plain: without mirrored and turned copies)')
     # Where the report split's false hits come from, and those that pass.
     m = sets == 'report'
-    passed, _ = decisions(quantised, feats[m])
+    passed = decide(quantised_all, cats[m], feats[m])
     origin = {}
     for r, lab, ok in zip([rows[i] for i in np.flatnonzero(m)], labels[m], passed):
         if lab == 0:
