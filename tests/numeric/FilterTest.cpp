@@ -8,7 +8,7 @@
 
 #include "core/Errors.h"
 #include "core/Json.h"
-#include "numeric/FilterFactory.h"
+#include "quorin/FilterFactory.h"
 #include "numeric/Fixtures.h"
 #include "quorin/Filter1D.h"
 #include "quorin/Filter2D.h"

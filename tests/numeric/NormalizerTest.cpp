@@ -8,7 +8,7 @@
 
 #include "core/Errors.h"
 #include "numeric/Fixtures.h"
-#include "numeric/NormalizerFactory.h"
+#include "quorin/NormalizerFactory.h"
 #include "quorin/Normalizers.h"
 #include "support/ExpectThrow.h"
 
