@@ -241,15 +241,12 @@ TEST_F(FaceScene, PerfectTrainingGivesInfiniteVotesAndNoLikelihood)
     HaarBoostingLDAObserver boost;
     boost.init(*cascade);
     std::mt19937 random(3);
-    std::uniform_real_distribution<float> spread(0.0f, 1.0f);
-    for (size_t s = 1; s < 5; ++s)
-        for (int i = 0; i < 8; ++i) {
-            HaarBoostingLDAObserver::TrainData row;
-            row.label = i % 2 == 0;
-            for (unsigned k = 0; k < 10; ++k) row.features.push_back(spread(random));
-            row.features[0] += row.label ? 100.0f : -100.0f;
-            boost.trainingSets[s].push_back(row);
-        }
+    for (int i = 0; i < 32; ++i) {
+        HaarBoostingLDAObserver::TrainData row{std::vector<float>(10), i % 2 == 0};
+        for (float& f : row.features) f = std::uniform_real_distribution<float>(0.0f, 1.0f)(random);
+        row.features[0] += row.label ? 100.0f : -100.0f;
+        boost.trainingSets[1 + i % 4].push_back(row);
+    }
     boost.trainClassifier(image, {}, {});
     EXPECT_EQ(boost.alphas, std::vector<float>(10, INFINITY));
     EXPECT_TRUE(std::isnan(boost.getLikelihood(image, truth))) << "infinite votes over an infinite sum";
@@ -276,6 +273,9 @@ TEST_F(FaceScene, CascadeTrackerOpensAFacePerUnmatchedDetection)
     EXPECT_EQ(t.cascades.alive, std::vector<bool>({false, true, true}));
     EXPECT_EQ(t.cascades.items[2].filters[0].getParticles().size(), 600u);
     EXPECT_TRUE(sameWindow(t.cascades.items[1].filters[0].getParticles().at(60), far)) << "the lattice's centre";
+    // The predicted windows answered that update: the next one starts over in slot 0.
+    t.update(image, {near});
+    EXPECT_EQ(t.cascades.alive, std::vector<bool>({true, false, false}));
 }
 
 TEST_F(FaceScene, CascadeFilterCopiesAndMovesPointAtTheirOwnObservers)
