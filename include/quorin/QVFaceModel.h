@@ -4,10 +4,10 @@
 #include <cstdint>
 #include <vector>
 
-#include "quorin/LDAModel.h"
 #include "quorin/export.h"
 
 class FaceModelData;
+struct LDAModel;  // quorin/LDAModel.h (with Eigen), needed only to build from one
 
 // The public handle of a face model: a linear discriminant (a projection vector
 // and two scalars), stored and exchanged as IVB bytes. Copies are deep. Every

@@ -2,6 +2,7 @@
 
 #include "container/FaceModelData.h"
 #include "core/ApiError.h"
+#include "quorin/LDAModel.h"
 
 namespace {
 const char* const kNotInitialized = "QVFaceModel not initialized properly";

@@ -2,7 +2,8 @@
 #  (a) docs/examples/c-host through `pkg-config --cflags --libs quorinapi`,
 #  (b) docs/examples/cpp-host through find_package(quorinapi),
 # each built against the installed files only and run on a real photo; the
-# C++ example's second program makes filters and normalizers by name.
+# C++ example's second program makes filters and normalizers by name and a
+# face model from a host's record.
 # Without the data cache both run on a plain frame and the test reports a skip.
 cmake_minimum_required(VERSION 3.16)
 
@@ -117,7 +118,8 @@ string(CONCAT blocks_expected
   "\"higherFilter\":{\"sigmaHorizontal\":1,\"sigmaVertical\":1}} 0.1940 0.1940 0.1940 -0.1940 -0.1940 -0.1940\n"
   "QV_NORMALIZER_L1 {} 0.3750 -0.5000 0.1250\n"
   "QV_NORMALIZER_L2HYS {\"clipThreshold\":0.5,\"alpha\":0} 0.5259 -0.8251 0.2063\n"
-  "null for unknown 1, null for refused 1, JsonError for malformed 1\n")
+  "null for unknown 1, null for refused 1, JsonError for malformed 1\n"
+  "face model of 2 values: 116 IVB bytes\n")
 if(NOT blocks_out STREQUAL blocks_expected)
   message(FATAL_ERROR "the factories' host printed:\n${blocks_out}\nexpected:\n${blocks_expected}")
 endif()

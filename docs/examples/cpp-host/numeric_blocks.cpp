@@ -1,12 +1,15 @@
 // Builds filters and normalizers from their descriptions through the
 // library's factories, prints each one's name and JSON form, and runs it on a
-// short signal: one line per object.
+// short signal: one line per object. Then stores a host's discriminant as a
+// face model.
 //
 //   numeric_blocks
 
 #include <quorin/FilterFactory.h>
 #include <quorin/JsonError.h>
+#include <quorin/LDAModel.h>
 #include <quorin/NormalizerFactory.h>
+#include <quorin/QVFaceModel.h>
 
 #include <cstdio>
 #include <memory>
@@ -64,5 +67,10 @@ int main() {
     }
     std::printf("null for unknown %d, null for refused %d, JsonError for malformed %d\n", unknownIsNull,
                 refusedIsNull, malformedRaises);
+
+    LDAModel lda;
+    lda.dimension = 2;
+    lda.projection = Eigen::Vector2f(0.5f, 0.25f);
+    std::printf("face model of %d values: %zu IVB bytes\n", lda.dimension, QVFaceModel(lda).toIvb().size());
     return 0;
 }
