@@ -60,9 +60,11 @@ public:
     std::vector<uint8_t> toIvb() const;
     // ensures: the fields read back in that order; for other data types the
     //          range keeps its present values.
+    //          A member stored with no element keeps its field as it was.
     // throws:  qv_ivb_conversion_error and the unpacker's errors on damaged bytes,
-    //          also for a member that is not exactly one element. Fields read
-    //          before the failure keep their new values.
+    //          also for a member that isn't a basic object of its type or holds
+    //          more than one element. Fields read before the failure keep
+    //          their new values.
     void fromIvb(const std::vector<uint8_t>& bytes);
 
 private:
@@ -106,7 +108,9 @@ public:
     // ensures: name, property and bytes read back; the buffer sized by init.
     // throws:  qv_ivb_conversion_error and the unpacker's errors on damaged bytes,
     //          among them a byte array whose length differs from the property's
-    //          byte size (checked before anything is allocated).
+    //          byte size (checked before anything is allocated) or that isn't
+    //          a basic object of raw bytes. A failure keeps the parts read
+    //          before it.
     void fromIvb(const std::vector<uint8_t>& bytes);
 
 private:

@@ -48,12 +48,13 @@ public:
     // ensures: the four members of the binary form.
     // throws:  qv_data_error "Could not find corresponding object id" for a
     //          missing member; qv_ivb_conversion_error "QV IVB object
-    //          conversion error" for damaged bytes, a member of another type,
-    //          rows whose length differs from centroidNum * dimension, or
-    //          centroids of dimension 0 (their number is not backed by any
-    //          stored byte); std::invalid_argument from the unpacker for a
-    //          member that isn't a basic object. On any failure the classifier
-    //          is unchanged.
+    //          conversion error" for damaged bytes, a number member that isn't
+    //          a basic object of its type, rows whose length differs from
+    //          centroidNum * dimension, or centroids of dimension 0 (their
+    //          number is not backed by any stored byte); std::invalid_argument
+    //          from the unpacker for a metric that isn't a basic object. A
+    //          count stored with no element keeps the present value. On any
+    //          failure the classifier is unchanged.
     void fromIvb(const std::vector<uint8_t>& bytes);
 
 private:
@@ -79,9 +80,10 @@ public:
 
     // requires: input holds `length` floats, output has room for pcaDim().
     // ensures:  output = projection * (input[0..rawDim) - mean); temporaries
-    //           are made per call. Nothing is written for pcaDim() 0.
-    // throws:   qv_invalid_argument when length < rawDim() (nothing is read
-    //           beyond what the caller says the input holds).
+    //           are made per call. Nothing is written for pcaDim() 0. length
+    //           takes no part in the result: elements beyond rawDim are not read.
+    // throws:   qv_invalid_argument when length < rawDim(): reading rawDim
+    //           floats would run past what the caller says the input holds.
     void transform(const float* input, unsigned int length, float* output) const;
 
     // ensures: the binary form, a composite IVB object of four nameless
@@ -95,12 +97,12 @@ public:
     // ensures: the four members of the binary form.
     // throws:  qv_data_error "Could not find corresponding object id" for a
     //          missing member; qv_ivb_conversion_error "QV IVB object
-    //          conversion error" for damaged bytes, a member of another type,
-    //          a mean or projection whose length differs from what rawDim and
-    //          pcaDim say, or pcaDim above 0 with rawDim 0 (an output length
-    //          not backed by any stored byte); std::invalid_argument from the
-    //          unpacker for a member that isn't a basic object. On any failure
-    //          the transform is unchanged.
+    //          conversion error" for damaged bytes, a member that isn't a
+    //          basic object of its type, a mean or projection whose length
+    //          differs from what rawDim and pcaDim say, or pcaDim above 0 with
+    //          rawDim 0 (an output length not backed by any stored byte). A
+    //          count stored with no element keeps the present value. On any
+    //          failure the transform is unchanged.
     void fromIvb(const std::vector<uint8_t>& bytes);
 
 private:

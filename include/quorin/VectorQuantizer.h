@@ -82,10 +82,10 @@ public:
     //          quantize throws qv_unsupported_error.
     // throws:  qv_data_error "Could not find corresponding object id" for a
     //          missing member; qv_ivb_conversion_error "QV IVB object
-    //          conversion error" for damaged bytes, a member of another type,
-    //          or an array whose length differs from what the counts say;
-    //          std::invalid_argument from the unpacker for a member that isn't
-    //          a basic object. On any failure the quantizer is unchanged.
+    //          conversion error" for damaged bytes, a member that isn't a basic
+    //          object of its type, or an array whose length differs from what
+    //          the counts say. A count stored with no element keeps the present
+    //          value. On any failure the quantizer is unchanged.
     void fromIvb(const std::vector<uint8_t>& bytes);
 
 private:

@@ -122,13 +122,15 @@ void DataProperty::fromIvb(const std::vector<uint8_t>& bytes) {
     unpacker.parse(bytes);
     // The stored value is the 32-bit pattern of the signed type; unknown values
     // are kept as they are and simply have no sub type.
-    dataType_ = static_cast<DataType>(static_cast<int32_t>(ivbmember::scalar<unsigned int>(unpacker, kTagDataType)));
-    xNum_ = ivbmember::scalar<unsigned int>(unpacker, kTagXNum);
-    yNum_ = ivbmember::scalar<unsigned int>(unpacker, kTagYNum);
-    fLen_ = ivbmember::scalar<unsigned int>(unpacker, kTagFLen);
+    unsigned int type = static_cast<unsigned int>(static_cast<int32_t>(dataType_));
+    ivbmember::scalar(unpacker, kTagDataType, type);
+    dataType_ = static_cast<DataType>(static_cast<int32_t>(type));
+    ivbmember::scalar(unpacker, kTagXNum, xNum_);
+    ivbmember::scalar(unpacker, kTagYNum, yNum_);
+    ivbmember::scalar(unpacker, kTagFLen, fLen_);
     if (hasRange(dataType_)) {
-        minVal_ = ivbmember::scalar<unsigned long long>(unpacker, kTagMinVal);
-        maxVal_ = ivbmember::scalar<unsigned long long>(unpacker, kTagMaxVal);
+        ivbmember::scalar(unpacker, kTagMinVal, minVal_);
+        ivbmember::scalar(unpacker, kTagMaxVal, maxVal_);
     }
 }
 
@@ -188,12 +190,8 @@ void DataBlob::fromIvb(const std::vector<uint8_t>& bytes) {
     // The stored bytes must be exactly what the property describes: more would
     // overrun the buffer, and a property claiming more than is stored would
     // allocate for bytes that are not there.
-    const uint32_t id = unpacker.getObjId(std::string(), kTagData);
-    QVIVBObjectSubType subType;
-    unsigned int count = 0;
-    unpacker.getBasicObjectPropertyImpl(id, subType, count);
-    if (subType.value() != qv_ivb_subtype_traits<void>::type || count != property.byteSize())
-        throw qv_ivb_conversion_error(kConversionError);
+    const unsigned long long size = property.byteSize();
+    const uint32_t id = ivbmember::checkedId(unpacker, kTagData, size);
     init(property);
-    unpacker.unpackBasicObjectImpl<void>(id, data_, count);
+    unpacker.unpackBasicObjectImpl<void>(id, data_, static_cast<unsigned int>(size));
 }

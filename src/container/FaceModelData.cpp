@@ -30,15 +30,13 @@ std::vector<uint8_t> FaceModelData::toIvb() const {
 void FaceModelData::fromIvb(const std::vector<uint8_t>& bytes) {
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(bytes);
-    const int32_t newDimension = ivbmember::scalar<int>(unpacker, kTagDimension);
-    const float newFirst = ivbmember::scalar<float>(unpacker, kTagFirstValue);
-    const float newSecond = ivbmember::scalar<float>(unpacker, kTagSecondValue);
-    if (newDimension < 0) throw qv_ivb_conversion_error(kConversionError);
-    const uint32_t id = ivbmember::checkedId(unpacker, kTagProjection, static_cast<unsigned int>(newDimension));
-    Eigen::VectorXf newProjection(newDimension);
-    unpacker.unpackBasicObjectImpl(id, newProjection.data(), static_cast<unsigned int>(newDimension));
-    dimension = newDimension;
-    firstValue = newFirst;
-    secondValue = newSecond;
+    // Each member as it is read, so that a failure keeps what came before it.
+    ivbmember::scalar(unpacker, kTagDimension, dimension);
+    ivbmember::scalar(unpacker, kTagFirstValue, firstValue);
+    ivbmember::scalar(unpacker, kTagSecondValue, secondValue);
+    if (dimension < 0) throw qv_ivb_conversion_error(kConversionError);
+    const uint32_t id = ivbmember::checkedId(unpacker, kTagProjection, static_cast<unsigned int>(dimension));
+    Eigen::VectorXf newProjection(dimension);
+    unpacker.unpackBasicObjectImpl(id, newProjection.data(), static_cast<unsigned int>(dimension));
     projection.swap(newProjection);
 }

@@ -5,13 +5,7 @@
 #include <cstdint>
 #include <vector>
 
-// A linear discriminant as a host may hold it.
-struct LDAModel {
-    int32_t dimension = 0;
-    Eigen::VectorXf projection;
-    float firstValue = 0.0f;
-    float secondValue = 0.0f;
-};
+#include "quorin/LDAModel.h"
 
 // The value behind QVFaceModel, with its IVB form: dimension (tag 64, int),
 // firstValue (160, float), secondValue (162, float), projection (161, floats).
@@ -26,7 +20,8 @@ public:
 
     // Throws qv_ivb_conversion_error when projection's length is not dimension.
     std::vector<uint8_t> toIvb() const;
-    // All or nothing: a failure leaves the value as it was. Throws the
+    // Reads dimension, firstValue, secondValue, then projection, each straight
+    // into its member: a failure keeps what was read before it. Throws the
     // unpacker's errors, and qv_ivb_conversion_error for a negative dimension
     // or a projection whose stored length is not the dimension.
     void fromIvb(const std::vector<uint8_t>& bytes);

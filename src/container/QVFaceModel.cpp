@@ -2,12 +2,15 @@
 
 #include "container/FaceModelData.h"
 #include "core/ApiError.h"
+#include "quorin/LDAModel.h"
 
 namespace {
 const char* const kNotInitialized = "QVFaceModel not initialized properly";
 }
 
 QVFaceModel::QVFaceModel() : data_(new FaceModelData()) {}
+
+QVFaceModel::QVFaceModel(const LDAModel& model) : data_(new FaceModelData(model)) {}
 
 QVFaceModel::QVFaceModel(const QVFaceModel& other) : data_(new FaceModelData()) {
     if (other.data_ != nullptr) *data_ = *other.data_;

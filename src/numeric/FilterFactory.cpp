@@ -1,4 +1,4 @@
-#include "numeric/FilterFactory.h"
+#include "quorin/FilterFactory.h"
 
 Filter1DFactory::Filter1DFactory() { init(); }
 

@@ -1,4 +1,4 @@
-#include "numeric/NormalizerFactory.h"
+#include "quorin/NormalizerFactory.h"
 
 QVNormalizerFactory::QVNormalizerFactory() { init(); }
 

@@ -73,8 +73,9 @@ std::vector<uint8_t> NearestCentroidClassifier::toIvb() const {
 void NearestCentroidClassifier::fromIvb(const std::vector<uint8_t>& bytes) {
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(bytes);
-    const unsigned int dimension = ivbmember::scalar<unsigned int>(unpacker, kTagDimension);
-    const unsigned int centroidNum = ivbmember::scalar<unsigned int>(unpacker, kTagCentroidNum);
+    unsigned int dimension = dimension_, centroidNum = centroidNum_;
+    ivbmember::scalar(unpacker, kTagDimension, dimension);
+    ivbmember::scalar(unpacker, kTagCentroidNum, centroidNum);
     // Empty rows store nothing, so their number would be the one count whose
     // memory no stored byte bounds.
     if (dimension == 0 && centroidNum > 0) throw qv_ivb_conversion_error(ivbmember::conversionError());
@@ -106,6 +107,9 @@ PcaTransform::PcaTransform(const Eigen::VectorXf& mean, const Eigen::MatrixXf& p
 }
 
 void PcaTransform::transform(const float* input, unsigned int length, float* output) const {
+    // The length is no factor of the result, but it is the caller's word on
+    // the input's size: copying rawDim floats from a shorter input would read
+    // past it, so that is refused instead.
     if (length < rawDim_) throw qv_invalid_argument(descrambleText(scrambled::kPcaInputTooShort));
     Eigen::VectorXf centred = Eigen::Map<const Eigen::VectorXf>(input, rawDim_);
     centred -= mean_;
@@ -130,8 +134,9 @@ std::vector<uint8_t> PcaTransform::toIvb() const {
 void PcaTransform::fromIvb(const std::vector<uint8_t>& bytes) {
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(bytes);
-    const unsigned int rawDim = ivbmember::scalar<unsigned int>(unpacker, kTagDimension);
-    const unsigned int pcaDim = ivbmember::scalar<unsigned int>(unpacker, kTagPcaDim);
+    unsigned int rawDim = rawDim_, pcaDim = pcaDim_;
+    ivbmember::scalar(unpacker, kTagDimension, rawDim);
+    ivbmember::scalar(unpacker, kTagPcaDim, pcaDim);
     // A projection of nothing stores no element, so its output length would be
     // bounded by no stored byte.
     if (rawDim == 0 && pcaDim > 0) throw qv_ivb_conversion_error(ivbmember::conversionError());

@@ -86,8 +86,9 @@ std::vector<uint8_t> VectorQuantizer::toIvb() const {
 void VectorQuantizer::fromIvb(const std::vector<uint8_t>& bytes) {
     QVIVBCompositeObjectUnpacker unpacker;
     unpacker.parse(bytes);
-    const unsigned int n = ivbmember::scalar<unsigned int>(unpacker, kTagInnerNodeNum);
-    const unsigned int dimension = ivbmember::scalar<unsigned int>(unpacker, kTagDimension);
+    unsigned int n = innerNodeNum_, dimension = dimension_;
+    ivbmember::scalar(unpacker, kTagInnerNodeNum, n);
+    ivbmember::scalar(unpacker, kTagDimension, dimension);
     if (n > kMaxInnerNodes) throw qv_ivb_conversion_error(ivbmember::conversionError());
     // The arrays' stored lengths are checked against the counts before any room
     // is made, so memory follows the bytes present, not what the counts claim.

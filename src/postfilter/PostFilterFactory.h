@@ -1,7 +1,7 @@
 #ifndef QUORIN_POSTFILTER_POSTFILTERFACTORY_H
 #define QUORIN_POSTFILTER_POSTFILTERFACTORY_H
 
-#include "core/ObjectFactory.h"
+#include "quorin/ObjectFactory.h"
 #include "postfilter/PostFilter.h"
 
 // Makes post filters by name: "ILABS_POSTFILTER", "LBP_SVM_POSTFILTER".

@@ -32,7 +32,9 @@ void CPFTracker::update(const IN_IMAGE& image, const std::vector<DetectionWindow
     std::vector<int> assignment;
     match(scores, &assignment);
 
-    std::vector<bool> seen(n + m, false);
+    // A new face may land in a slot beyond the n predicted ones (an update
+    // without a predict has n of 0), so seen covers every slot there is.
+    std::vector<bool> seen(cascades.size() + m, false);
     for (size_t i = 0; i < m; ++i) {
         int j = i < assignment.size() ? assignment[i] : -1;
         if (j < 0) {
@@ -42,14 +44,18 @@ void CPFTracker::update(const IN_IMAGE& image, const std::vector<DetectionWindow
             fresh.init(*detector);
             j = int(cascades.insert(fresh));
         }
-        if (size_t(j) < seen.size()) seen[size_t(j)] = true;
+        seen[size_t(j)] = true;
         cascades.items[size_t(j)].update(image, detections[i]);
     }
 
     // As in the simple tracker, dead slots are stacked again every frame.
     for (size_t j = 0; j < cascades.size(); ++j)
-        if (j >= seen.size() || !seen[j]) cascades.remove(uint32_t(j));
+        if (!seen[j]) cascades.remove(uint32_t(j));
     cascades.boundFreeSlots();
+    // The windows belong to the predict just answered: the next update
+    // without a predict of its own matches nothing and opens a face per
+    // detection.
+    lastPredicted.clear();
 
     ++frameCounter;
 }

@@ -6,8 +6,8 @@
 
 float LDAClassifier::getScore(const std::vector<float>& features) const
 {
-    if (Eigen::Index(features.size()) != weights.size())
-        throw qv_invalid_argument("Feature vector length differs from the LDA classifier's");
+    if (Eigen::Index(features.size()) > weights.size())
+        throw qv_invalid_argument("Feature vector is longer than the LDA classifier's");
     float sum = 0.0f;
     for (size_t i = 0; i < features.size(); ++i) sum += weights[Eigen::Index(i)] * features[i];
     return sum - threshold;

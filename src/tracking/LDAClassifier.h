@@ -10,8 +10,10 @@
 // side of the positive class.
 class LDAClassifier {
 public:
-    // sum(weights[i] * features[i]) - threshold, in single precision. Raises
-    // qv_invalid_argument when features and weights differ in length.
+    // sum(weights[i] * features[i]) over the length of features, less
+    // threshold, in single precision: empty features give -threshold, shorter
+    // ones a partial sum. Raises qv_invalid_argument for features longer than
+    // weights, whose sum would read past the weights.
     float getScore(const std::vector<float>& features) const;
 
     // Raises qv_operation_error "Train LDA classifier with no features" with

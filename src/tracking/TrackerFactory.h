@@ -1,7 +1,7 @@
 #ifndef QUORIN_TRACKING_TRACKERFACTORY_H
 #define QUORIN_TRACKING_TRACKERFACTORY_H
 
-#include "core/ObjectFactory.h"
+#include "quorin/ObjectFactory.h"
 #include "tracking/Tracker.h"
 
 // Makes trackers by name from {"name": ..., "param": ...}. Names that are not

@@ -111,7 +111,9 @@ TEST(IvbGolden, FaceHandlesBothWaysAndCopiesAreDeep) {
     model.fromIvb(ivbgolden::faceModel());
     QVFaceModel modelCopy(model);
     model.fromIvb(QVFaceModel().toIvb());
+    EXPECT_EQ(model.toIvb(), QVFaceModel().toIvb());
     EXPECT_EQ(modelCopy.toIvb(), ivbgolden::faceModel());
+    EXPECT_EQ(QVFaceModel(lda).toIvb(), ivbgolden::faceModel()) << "the host's record";
 
     QVFaceRepresentation representation;
     representation.fromIvb(ivbgolden::byteBlob());
@@ -206,9 +208,9 @@ TEST(IvbUnpacker, TruncatedAndDamagedBlobsAndModelsFailCleanly) {
             FaceModelData model;
             try {
                 model.fromIvb(withByte(modelBytes, i, v));
+                EXPECT_EQ(model.projection.size(), model.dimension) << i;
             } catch (const std::exception&) {
             }
-            EXPECT_EQ(model.projection.size(), model.dimension) << i;
         }
     }
 }
@@ -230,28 +232,38 @@ TEST(IvbUnpacker, CountsThatDisagreeWithTheDataAreRefusedBeforeAllocating) {
     // More bytes stored than the property says: would overrun the buffer.
     EXPECT_THROW(blob.fromIvb(blobWith(DataProperty(DataProperty::BYTES, 1, 1, 1))), qv_ivb_conversion_error);
 
-    // Face models with a damaged dimension (at 36) or projection size (at 96)
-    // keep their value when refused.
+    // Damaged face models (dimension at 36, its sub type at 29, the
+    // projection's size at 96, kind at 100, sub type at 101) are refused with
+    // the conversion error, keeping the members read before the failure: dimension 2
+    // and the scalars 1.5, -2 of the golden model, or nothing.
     const Bytes good = ivbgolden::faceModel();
     auto withDimension = [&](uint32_t d) {
         Bytes b = good;
         for (int i = 0; i < 4; ++i) b[36 + i] = static_cast<uint8_t>(d >> (8 * i));
         return b;
     };
-    const std::vector<std::pair<const char*, Bytes>> models = {
-        {"dimension above the stored floats", withDimension(3)},
-        {"dimension below the stored floats", withDimension(1)},
-        {"negative dimension", withDimension(0xFFFFFFFEu)},
-        {"2^31 - 1 floats claimed", withDimension(0x7FFFFFFFu)},
-        {"dimension as float", withByte(good, 29, 0x0C)},
-        {"projection size broken", withByte(good, 96, 0x19)},
-        {"truncated", Bytes(good.begin(), good.end() - 1)},
+    const struct {
+        const char* what;
+        Bytes bytes;
+        int32_t dimension;  // the scalars were read with it unless it is 0
+    } models[] = {
+        {"dimension above the stored floats", withDimension(3), 3},
+        {"dimension below the stored floats", withDimension(1), 1},
+        {"negative dimension", withDimension(0xFFFFFFFEu), -2},
+        {"2^31 - 1 floats claimed", withDimension(0x7FFFFFFFu), 0x7FFFFFFF},
+        {"projection as a composite", withByte(good, 100, ivb::kComposite), 2},
+        {"projection of sub type 14", withByte(good, 101, 14), 2},
+        {"dimension as float", withByte(good, 29, 0x0C), 0},
+        {"projection size broken", withByte(good, 96, 0x19), 0},
+        {"truncated", Bytes(good.begin(), good.end() - 1), 0},
     };
     for (const auto& c : models) {
         FaceModelData data;
-        data.fromIvb(good);
-        EXPECT_THROW(data.fromIvb(c.second), std::exception) << c.first;
-        EXPECT_EQ(data.toIvb(), good) << c.first;
+        EXPECT_THROW(data.fromIvb(c.bytes), qv_ivb_conversion_error) << c.what;
+        const bool scalarsRead = c.dimension != 0;
+        EXPECT_EQ(std::vector<float>({float(data.dimension), data.firstValue, data.secondValue, float(data.projection.size())}),
+                  std::vector<float>({float(c.dimension), scalarsRead ? 1.5f : 0.0f, scalarsRead ? -2.0f : 0.0f, 0.0f}))
+            << c.what;
     }
 }
 

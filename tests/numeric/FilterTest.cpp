@@ -8,7 +8,7 @@
 
 #include "core/Errors.h"
 #include "core/Json.h"
-#include "numeric/FilterFactory.h"
+#include "quorin/FilterFactory.h"
 #include "numeric/Fixtures.h"
 #include "quorin/Filter1D.h"
 #include "quorin/Filter2D.h"
@@ -22,6 +22,12 @@ std::vector<float> coefficients(const QVFilterKernel1D& k) {
     return c;
 }
 
+QVFilterKernel1D kernel(int anchor, const std::vector<float>& values) {
+    QVFilterKernel1D k(anchor, static_cast<unsigned int>(values.size()));
+    for (unsigned int i = 0; i < k.size(); ++i) k[i] = values[i];
+    return k;
+}
+
 std::vector<float> filtered(Filter1D& f, const std::vector<float>& signal) {
     std::vector<float> out(signal.size());
     f.filter(signal.data(), static_cast<int>(signal.size()), 1, 1, out.data());
@@ -30,16 +36,26 @@ std::vector<float> filtered(Filter1D& f, const std::vector<float>& signal) {
 
 }  // namespace
 
-// Borders and strides are checked against the references below; what they
-// cannot show: nothing is read or written for an empty signal, and an empty
-// kernel yields 0.
-TEST(FilterKernel1D, EmptySignalsAndKernels) {
-    float untouched = 5.0f;
-    QVFilterKernel1D identity(0, 1);
-    identity[0] = 1.0f;
-    identity.filter(nullptr, 0, 1, 1, &untouched);
-    EXPECT_EQ(untouched, 5.0f);
+// Borders and strides are checked against the references below; what their
+// symmetric kernels cannot show: the kernel runs backwards over the signal,
+// sums align on the anchors, nothing is read or written for an empty signal,
+// and an empty kernel yields 0.
+TEST(FilterKernel1D, DirectionSumsAndEmptyCases) {
     const std::vector<float> data = {1, 10, 100, 1000};
+    std::vector<float> out(4);
+    kernel(0, {1, 2}).filter(data.data(), 4, 1, 1, out.data());  // data[i] + 2 data[i - 1], data[-1] = data[0]
+    EXPECT_EQ(out, std::vector<float>({3, 12, 120, 1200}));
+    const QVFilterKernel1D a = kernel(1, {1, 2, 3}), b = kernel(3, {10, 20, 30, 40, 50, 60, 70});
+    for (const QVFilterKernel1D& sum : {a + b, b + a}) {
+        EXPECT_EQ(sum.getAnchor(), 3);
+        EXPECT_EQ(coefficients(sum), std::vector<float>({10, 20, 31, 42, 53, 60, 70}));
+    }
+    // Where only b reaches, a - b keeps +b.
+    EXPECT_EQ(coefficients(a - b), std::vector<float>({10, 20, -29, -38, -47, 60, 70}));
+
+    float untouched = 5.0f;
+    kernel(0, {1}).filter(nullptr, 0, 1, 1, &untouched);
+    EXPECT_EQ(untouched, 5.0f);
     QVFilterKernel1D().filterAt(data.data(), 4, 1, 2, &untouched);
     EXPECT_EQ(untouched, 0.0f);
 }

@@ -8,7 +8,7 @@
 
 #include "core/Errors.h"
 #include "numeric/Fixtures.h"
-#include "numeric/NormalizerFactory.h"
+#include "quorin/NormalizerFactory.h"
 #include "quorin/Normalizers.h"
 #include "support/ExpectThrow.h"
 
@@ -42,9 +42,6 @@ TEST(Normalizers, MatchNumpyInPlaceOrNot) {
         n->normalize(inPlace.data(), static_cast<unsigned int>(inPlace.size()), inPlace.data());
         EXPECT_EQ(inPlace, out);
     }
-    for (const char* bad :
-         {"{\"name\":\"QV_NORMALIZER_L1\",\"param\":{\"x\":1}}", "{\"name\":\"QV_NORMALIZER_L1SQRT\"}"})
-        EXPECT_EQ(std::unique_ptr<QVNormalizer>(QVNormalizerFactory::instance().createInstance(bad)), nullptr) << bad;
 }
 
 TEST(Normalizers, EmptyZeroClippedAndNegativeInput) {

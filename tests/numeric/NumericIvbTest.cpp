@@ -56,11 +56,12 @@ Bytes raw(std::initializer_list<T> values) {
     return out;
 }
 
-// One member: a basic object of any sub type over raw element bytes.
+// One member: an object of any kind and sub type over raw element bytes.
 struct Member {
     uint32_t tag;
     uint8_t subType;
     Bytes elements;
+    uint8_t kind = ivb::kBasic;
 };
 constexpr uint8_t kF = 12, kU = 8, kI = 9, kC = 3, kUC = 4;
 
@@ -68,7 +69,7 @@ Bytes composite(const std::vector<Member>& members) {
     QVIVBCompositeObjectPacker packer;
     for (const Member& m : members) {
         Bytes object(16 + m.elements.size());
-        ivb::putObjectHeader(object.data(), object.size(), ivb::kBasic, m.subType);
+        ivb::putObjectHeader(object.data(), object.size(), m.kind, m.subType);
         std::copy(m.elements.begin(), m.elements.end(), object.begin() + 16);
         packer.appendObjInfo(std::string(), m.tag);
         packer.appendObj(object);
@@ -91,9 +92,11 @@ TEST(VectorQuantizer, RoutesThroughTheTreeAndRefusesTreesThatDoNotFit) {
     EXPECT_THROW(q.setTree(2, 2, {1, 0, 0, 1}, {0}), qv_invalid_argument);
     EXPECT_THROW(q.setTree(1, 0, {}, {0}), qv_invalid_argument);
     EXPECT_EQ(q.codeNum(), 4u);
-    // No inner node: one leaf of code 0 that never reads the vector.
-    q.fromIvb(composite({{96, kU, raw<uint32_t>({0})}, {64, kU, raw<uint32_t>({7})}, {97, kF, {}}, {98, kF, {}}}));
+    // No inner node: one leaf of code 0 that never reads the vector. A
+    // dimension stored with no element keeps the present one.
+    q.fromIvb(composite({{96, kU, raw<uint32_t>({0})}, {64, kU, {}}, {97, kF, {}}, {98, kF, {}}}));
     EXPECT_EQ(q.quantize(nullptr), 0u);
+    EXPECT_EQ(q.dimension(), 2u);
 }
 
 TEST(NearestCentroidClassifier, L1DistanceTiesAndChecks) {
@@ -103,6 +106,8 @@ TEST(NearestCentroidClassifier, L1DistanceTiesAndChecks) {
     EXPECT_THROW(c.classify({1, 2}), qv_data_error);
     EXPECT_THROW(NearestCentroidClassifier(2, {{1, 2}}, "L2").classify({5, 5}), qv_operation_error);
     EXPECT_THROW(NearestCentroidClassifier(2, {{1, 2}, {3}}, "L1"), qv_invalid_argument);
+    EXPECT_EQ(NearestCentroidClassifier(2, {}, "L1").classify({5, 5}), 0u) << "no centroids";
+    EXPECT_THROW(NearestCentroidClassifier().classify({}), qv_operation_error) << "no metric";
 }
 
 TEST(PcaTransform, MatchesNumpyAndChecksSizes) {
@@ -161,6 +166,9 @@ TEST(NumericIvb, DamagedMembersGetTheirErrors) {
         {"thresholds missing", 0, {{96, kU, one}, {64, kU, two}, {97, kF, w}}, kMissing},
         {"innerNodeNum stored as int", 0, {{96, kI, one}, {64, kU, two}, {97, kF, w}, {98, kF, t}}, kConversion},
         {"weights of sub type 0", 0, {{96, kU, one}, {64, kU, two}, {97, 0, w}, {98, kF, t}}, kConversion},
+        {"weights of sub type 14", 0, {{96, kU, one}, {64, kU, two}, {97, 14, w}, {98, kF, t}}, kConversion},
+        {"dimension as a composite", 0, {{96, kU, one}, {64, 0, {}, ivb::kComposite}, {97, kF, w}, {98, kF, t}},
+         kConversion},
         {"heap indices beyond int", 0,
          {{96, kU, raw<uint32_t>({0x3FFFFFFF})}, {64, kU, zero}, {97, kF, {}}, {98, kF, t}}, kConversion},
         {"many rows of dimension 0", 1,
@@ -173,6 +181,8 @@ TEST(NumericIvb, DamagedMembersGetTheirErrors) {
         {"outputs from no input", 2,
          {{64, kU, zero}, {128, kU, raw<uint32_t>({0x40000000})}, {129, kF, {}}, {130, kF, {}}}, kConversion},
         {"mean longer than rawDim", 2, {{64, kU, one}, {128, kU, one}, {129, kF, w}, {130, kF, t}}, kConversion},
+        {"projection as a composite", 2, {{64, kU, one}, {128, kU, one}, {129, kF, t}, {130, kF, t, ivb::kComposite}},
+         kConversion},
         {"pcaDim missing", 2, {{64, kU, one}, {129, kF, t}, {130, kF, t}}, kMissing},
     };
     for (const Case& c : cases) {

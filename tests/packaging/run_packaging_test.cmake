@@ -1,7 +1,9 @@
 # Installs the build into a scratch prefix and proves the install usable:
 #  (a) docs/examples/c-host through `pkg-config --cflags --libs quorinapi`,
 #  (b) docs/examples/cpp-host through find_package(quorinapi),
-# each built against the installed files only and run on a real photo.
+# each built against the installed files only and run on a real photo; the
+# C++ example's second program makes filters and normalizers by name and a
+# face model from a host's record.
 # Without the data cache both run on a plain frame and the test reports a skip.
 cmake_minimum_required(VERSION 3.16)
 
@@ -104,6 +106,23 @@ if(NOT cpp_args)
 endif()
 run("running the C++ host" COMMAND ${WORK_DIR}/cpp-build/detect_faces ${cpp_args} OUTPUT cpp_out)
 message("C++ host:\n${cpp_out}")
+
+# The factories' program: filters and normalizers made from their descriptions,
+# their JSON forms (four filter layouts) and outputs on a fixed signal.
+run("running the factories' host" COMMAND ${WORK_DIR}/cpp-build/numeric_blocks OUTPUT blocks_out)
+string(CONCAT blocks_expected
+  "QV_FILTER1D_GAUSSIAN {\"sigma\":1} 0.0044 0.0584 0.3005 0.6995 0.9416 0.9956\n"
+  "QV_FILTER1D_DOG {\"sigmaL\":0.5, \"sigmaH\":1} 0.0044 0.0584 0.1940 -0.1940 -0.0584 -0.0044\n"
+  "QV_FILTER2D_GAUSSIAN {\"sigmaHorizontal\":1,\"sigmaVertical\":0.5} 0.1065 0.1065 0.1065 0.8935 0.8935 0.8935\n"
+  "QV_FILTER2D_DOG {\"lowerFilter\":{\"sigmaHorizontal\":0.5,\"sigmaVertical\":0.5}, "
+  "\"higherFilter\":{\"sigmaHorizontal\":1,\"sigmaVertical\":1}} 0.1940 0.1940 0.1940 -0.1940 -0.1940 -0.1940\n"
+  "QV_NORMALIZER_L1 {} 0.3750 -0.5000 0.1250\n"
+  "QV_NORMALIZER_L2HYS {\"clipThreshold\":0.5,\"alpha\":0} 0.5259 -0.8251 0.2063\n"
+  "null for unknown 1, null for refused 1, JsonError for malformed 1\n"
+  "face model of 2 values: 116 IVB bytes\n")
+if(NOT blocks_out STREQUAL blocks_expected)
+  message(FATAL_ERROR "the factories' host printed:\n${blocks_out}\nexpected:\n${blocks_expected}")
+endif()
 
 # Both must report the photo's faces, each with a line.
 foreach(host c cpp)

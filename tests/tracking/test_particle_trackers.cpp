@@ -9,6 +9,7 @@
 #include <cmath>
 #include <limits>
 #include <memory>
+#include <random>
 #include <vector>
 
 #include "core/Errors.h"
@@ -16,6 +17,7 @@
 #include "support/ExpectThrow.h"
 #include "support/FaceSequence.h"
 #include "support/TrackSupport.h"
+#include "tracking/CPFTracker.h"
 #include "tracking/CascadePF.h"
 #include "tracking/LDAClassifier.h"
 #include "tracking/Observer.h"
@@ -160,14 +162,18 @@ TEST(LDAClassifierTrain, RefusesWhatItCannotRead)
 {
     LDAClassifier lda;
     lda.train({{3.0f, 1.0f}, {3.5f, 1.2f}, {-1.0f, 2.0f}, {-1.2f, 2.5f}}, {true, true, false, false});
-    EXPECT_THROW(lda.getScore({1.0f}), qv_invalid_argument) << "a vector of another length";
+    // Shorter features give a partial sum, none -threshold; longer ones would
+    // read past the weights.
+    EXPECT_EQ(lda.getScore({2.0f}), lda.weights[0] * 2.0f - lda.threshold);
+    EXPECT_EQ(lda.getScore({}), -lda.threshold);
+    EXPECT_NE(lda.threshold, 0.0f);
+    EXPECT_THROW(lda.getScore({1.0f, 2.0f, 3.0f}), qv_invalid_argument);
 
     expectThrowWith<qv_operation_error>([&] { lda.train({}, {}); }, "Train LDA classifier with no features");
     EXPECT_THROW(lda.train({{1.0f, 2.0f}, {1.0f}}, {true, false}), qv_invalid_argument);
     EXPECT_THROW(lda.train({{1.0f}}, {true, false}), qv_invalid_argument);
     // All labels true: the empty class has no mean; training goes on.
     EXPECT_NO_THROW(lda.train({{1.0f, 2.0f}, {2.0f, 1.0f}}, {true, true}));
-    EXPECT_EQ(LDAClassifier().getScore({}), 0.0f);
 }
 
 TEST_F(FaceScene, HaarObserversReadOnlyWindowsInsideTheImage)
@@ -194,7 +200,7 @@ TEST_F(FaceScene, HaarObserversReadOnlyWindowsInsideTheImage)
         const float a = lda.getLikelihood(image, c.window), b = boost.getLikelihood(image, c.window);
         if (c.inside) {
             EXPECT_GT(a, 0.0f);
-            EXPECT_TRUE(std::isnan(b) || (b >= 0.0f && b <= 1.0f)) << "the vote runs inside the image";
+            EXPECT_TRUE(b >= 0.0f && b <= 1.0f) << "the vote runs inside the image: " << b;
         } else {
             EXPECT_EQ(std::vector<float>({a, b}), std::vector<float>({0.0f, 0.0f}));
         }
@@ -226,6 +232,50 @@ TEST_F(FaceScene, TrainingLeavesOutUnreadableWindowsAndKeepsARingOfFiveSets)
     }
     const size_t expected[5] = {110, 111, 107, 108, 109}; // rounds 10, 11, 7, 8, 9
     for (size_t s = 0; s < 5; ++s) EXPECT_EQ(boost.trainingSets[s].size(), expected[s]) << s;
+}
+
+TEST_F(FaceScene, PerfectTrainingGivesInfiniteVotesAndNoLikelihood)
+{
+    // Rows 200 apart on the first feature and spread on all ten: the
+    // discriminants separate them without an error, so e is 0 in every round.
+    HaarBoostingLDAObserver boost;
+    boost.init(*cascade);
+    std::mt19937 random(3);
+    for (int i = 0; i < 32; ++i) {
+        HaarBoostingLDAObserver::TrainData row{std::vector<float>(10), i % 2 == 0};
+        for (float& f : row.features) f = std::uniform_real_distribution<float>(0.0f, 1.0f)(random);
+        row.features[0] += row.label ? 100.0f : -100.0f;
+        boost.trainingSets[1 + i % 4].push_back(row);
+    }
+    boost.trainClassifier(image, {}, {});
+    EXPECT_EQ(boost.alphas, std::vector<float>(10, INFINITY));
+    EXPECT_TRUE(std::isnan(boost.getLikelihood(image, truth))) << "infinite votes over an infinite sum";
+}
+
+TEST_F(FaceScene, CascadeTrackerOpensAFacePerUnmatchedDetection)
+{
+    CPFTracker t;
+    t.setDetector(*cascade);
+    // Without a predict since the last update nothing matches: every detection
+    // opens a face, in a slot beyond the earlier ones, and those die.
+    t.update(image, {truth, makeWindow(20, 20, 84, 84)});
+    t.update(image, {truth});
+    EXPECT_EQ(t.cascades.alive, std::vector<bool>({false, false, true}));
+    // Two detections on the one predicted window: the larger overlap keeps the
+    // trained face (its first filter holds the last one's 600 particles), the
+    // other opens a face seeded around it in the last freed slot.
+    std::vector<DetectionWindow> out;
+    t.predict(image, &out);
+    ASSERT_EQ(out.size(), 1u);
+    const DetectionWindow near = makeWindow(out[0].left + 2, out[0].top, out[0].right + 2, out[0].bottom);
+    const DetectionWindow far = makeWindow(out[0].left + 12, out[0].top, out[0].right + 12, out[0].bottom);
+    t.update(image, {far, near});
+    EXPECT_EQ(t.cascades.alive, std::vector<bool>({false, true, true}));
+    EXPECT_EQ(t.cascades.items[2].filters[0].getParticles().size(), 600u);
+    EXPECT_TRUE(sameWindow(t.cascades.items[1].filters[0].getParticles().at(60), far)) << "the lattice's centre";
+    // The predicted windows answered that update: the next one starts over in slot 0.
+    t.update(image, {near});
+    EXPECT_EQ(t.cascades.alive, std::vector<bool>({true, false, false}));
 }
 
 TEST_F(FaceScene, CascadeFilterCopiesAndMovesPointAtTheirOwnObservers)
