@@ -4,9 +4,16 @@
 /*
  * libquorinapi: on-device face detection and tracking, C entry points.
  *
- * One session per process, driven from one thread at a time (no entry is
- * thread-safe, quorin_init and quorin_release included). Frames are 8-bit
- * gray, width*height bytes without row padding.
+ * One session per process, meant to be driven from one thread at a time,
+ * quorin_init and quorin_release included. As a safety guard the session has
+ * one lock, held for the whole of every entry: calls from several threads at
+ * once run one after the other instead of corrupting the session. A
+ * quorin_release while another thread detects waits for that detection and
+ * then closes the session; calls after it behave as without a session. The
+ * guard gives no order between threads: a host that interleaves them still
+ * gets each thread's frames mixed with the others' (the orientation search and
+ * the tracker follow one stream of frames). Frames are 8-bit gray,
+ * width*height bytes without row padding.
  *
  * Result blocks. Every face is reported as a block of 17 ints at
  * results + 17*k, best score first:

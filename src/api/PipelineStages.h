@@ -27,6 +27,5 @@ public:
 
 // Installs `stages` (not owned) for all pipelines; null restores the engines.
 void setPipelineStagesOverride(PipelineStages* stages);
-PipelineStages* pipelineStagesOverride();
 
 #endif
