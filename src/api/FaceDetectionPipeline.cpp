@@ -10,7 +10,7 @@
 #include "core/FaceModelPaths.h"
 #include "core/FaceModelPathsHandle.h"
 #include "core/Json.h"
-#include "detector/FaceDetector.h"
+#include "engine/FaceDetector.h"
 #include "faceparts/FacePartLocator.h"
 
 namespace {

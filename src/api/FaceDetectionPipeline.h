@@ -5,7 +5,7 @@
 
 #include "api/DetectionRequest.h"
 #include "core/FaceRecord.h"
-#include "detector/FaceTrackingMode.h"
+#include "engine/FaceTrackingMode.h"
 
 class FaceDetector;
 class FacePartLocator;
