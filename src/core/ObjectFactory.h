@@ -1,10 +1,27 @@
 #ifndef QUORIN_CORE_OBJECTFACTORY_H
 #define QUORIN_CORE_OBJECTFACTORY_H
 
+#include <exception>
 #include <map>
+#include <memory>
 #include <string>
 
 #include "core/Json.h"
+
+// The body of every static create(text): a new T read from `text` with its
+// fromJson, or null when the construction or the reading throws a standard
+// exception.
+template <typename T>
+T* createFromText(const std::string& text) {
+    std::unique_ptr<T> object;
+    try {
+        object.reset(new T());
+        object->fromJson(text);
+    } catch (const std::exception&) {
+        return nullptr;
+    }
+    return object.release();
+}
 
 // Name -> creator map through which trackers, post filters, filters and
 // normalizers are made from a description text {"name":"X","param":{...}}.

@@ -43,20 +43,6 @@ protected:
     virtual bool passesUnjudged(ScoredWindow const&) const { return false; }
     virtual bool judge(ScoredWindow const& hit, const float* values, int count) const = 0;
 
-    // A new filter configured from `parameters`, or null when a std::exception
-    // is raised on the way (malformed text, unknown or bad model).
-    template <class Filter>
-    static PostFilter* createConfigured(const std::string& parameters)
-    {
-        std::unique_ptr<Filter> filter(new Filter());
-        try {
-            filter->fromJson(parameters);
-        } catch (const std::exception&) {
-            return nullptr;
-        }
-        return filter.release();
-    }
-
 private:
     void extract(IN_IMAGE const& image, ScoredWindow const& hit, IMAGE& patch, float* pixels, float* out) const;
 
