@@ -5,6 +5,8 @@
 #include <cstring>
 #include <limits>
 
+#include "image/PixelMemory.h"
+
 IMAGE::IMAGE(int w, int h, int s, unsigned char* pixels)
 {
     if (pixels == nullptr) {
@@ -62,16 +64,9 @@ bool IMAGE::Realloc(int w, int h)
         Release();
         return false;
     }
-    if (bytes > capacity) {
-        unsigned char* fresh = static_cast<unsigned char*>(std::malloc(static_cast<size_t>(bytes)));
-        if (fresh == nullptr) {
-            Release();
-            return false;
-        }
-        if (capacity > 0)
-            std::free(data);
-        data = fresh;
-        capacity = static_cast<int32_t>(bytes);
+    if (!growPixels(data, capacity, bytes)) {
+        Release();
+        return false;
     }
     width = w;
     height = h;
@@ -81,10 +76,7 @@ bool IMAGE::Realloc(int w, int h)
 
 void IMAGE::Release()
 {
-    if (capacity > 0) {
-        std::free(data);
-        data = nullptr;
-    }
+    freePixels(data, capacity);
     width = stride = height = capacity = 0;
 }
 
