@@ -32,8 +32,6 @@ public:
     // histogram of its window cropped and scaled to 24 x 24.
     std::vector<float> feature(IN_IMAGE const& image, ScoredWindow const& hit) const;
 
-    const LbpDescriptor& getDescriptor() const { return descriptor; }
-
 protected:
     // transposedPatch: the model was made on the patch read column by column.
     explicit LbpPatchFilter(bool transposedPatch);
