@@ -278,8 +278,7 @@ SessionSnapshot DetectionSession::snapshot() {
     return s;
 }
 
-// Step 12 of a frame: blend weight of a new rectangle against the slot's old
-// block. The gate that leads here never opens (see detectPixels), so this
+// Blend weight of a new rectangle against the slot's old block. The gate that leads here never opens (see detectPixels), so this
 // always yields 0; it stays so that the behaviour is the designed one.
 float DetectionSession::blendWeight(bool gateOpen, int32_t slot, const Rect2<int32_t>& r,
                                     const int32_t*& old) const {
