@@ -66,6 +66,9 @@
  *     - std::invalid_argument "No value available for the input landmark" if
  *       the landmark locator left a point out: a guard that the built-in
  *       models never reach.
+ *     Every ApiError carries its text in a std::string: when the heap can't
+ *     even hold that, std::bad_alloc leaves in its place, from any entry but
+ *     quorin_release.
  */
 
 #include "quorin/export.h"

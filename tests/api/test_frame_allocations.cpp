@@ -40,6 +40,8 @@ std::size_t g_requests = 0;
 // Requests of g_refuseFrom to g_refuseTo bytes are refused.
 std::size_t g_refuseFrom = SIZE_MAX;
 std::size_t g_refuseTo = SIZE_MAX;
+// Refuses only operator new, not the malloc family.
+bool g_refuseNewOnly = false;
 
 // False for a request that is to be refused.
 bool note(std::size_t bytes) {
@@ -53,12 +55,12 @@ bool note(std::size_t bytes) {
 }  // namespace
 
 extern "C" {
-void* __wrap_malloc(std::size_t size) { return note(size) ? __real_malloc(size) : nullptr; }
+void* __wrap_malloc(std::size_t size) { return note(size) || g_refuseNewOnly ? __real_malloc(size) : nullptr; }
 void* __wrap_calloc(std::size_t count, std::size_t size) {
-    return note(count * size) ? __real_calloc(count, size) : nullptr;
+    return note(count * size) || g_refuseNewOnly ? __real_calloc(count, size) : nullptr;
 }
 void* __wrap_realloc(void* pointer, std::size_t size) {
-    return note(size) ? __real_realloc(pointer, size) : nullptr;
+    return note(size) || g_refuseNewOnly ? __real_realloc(pointer, size) : nullptr;
 }
 void __wrap_free(void* pointer) { __real_free(pointer); }
 }
@@ -162,6 +164,9 @@ TEST(MemoryFailures, LeaveTheEntriesAsTheirContractsSay) {
     // The engines' models: ApiError; the session's own buffers: std::bad_alloc.
     expectThrowWith<ApiError>([&] { refusing(1 << 20, [] { quorin_init(); }); },
                               "QVFace Detection API initialization error");
+    // That session refuses frames and mode changes.
+    expectThrowWith<ApiError>([] { quorin_setDetectionMode(sessionSnapshot().detectionMode == 1 ? 2u : 1u); },
+                              "QVFace Detection API set search step error");
     EXPECT_THROW(refusing(kOrientationFrameBytes, [] { quorin_init(); }, kOrientationFrameBytes), std::bad_alloc);
     quorin_init();
     std::vector<unsigned char> frame = qtest::patternFrame(64, 48);
@@ -178,6 +183,20 @@ TEST(MemoryFailures, LeaveTheEntriesAsTheirContractsSay) {
     frame = qtest::patternFrame(1500, 1000);
     EXPECT_THROW(refusing(1500 * 1000, [&] { quorin_detect360Tracking(frame.data(), 1500, 1000, results.data(), 1); }),
                  std::bad_alloc);
+    // The engines' own small requests: ApiError with the text of the step.
+    g_refuseNewOnly = true;
+    quorin_setDetectionMode(2);
+    expectThrowWith<ApiError>([&] { refusing(256, [] { quorin_setDetectionMode(1); }); },
+                              "QVFace Detection API set mode error");
+    const std::vector<unsigned char> photo = facePhoto();
+    if (!photo.empty()) {
+        quorin_setDetectionMode(0);
+        frame = photo;
+        expectThrowWith<ApiError>(
+            [&] { refusing(256, [&] { quorin_detect(frame.data(), kWidth, kHeight, results.data(), 1, 0); }); },
+            "QVFace Detection API detect error");
+    }
+    g_refuseNewOnly = false;
     // None of it broke the session.
     frame = qtest::patternFrame(kWidth, kHeight);
     EXPECT_NO_THROW(quorin_detect(frame.data(), kWidth, kHeight, results.data(), 1, 0));
