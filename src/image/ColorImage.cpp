@@ -10,10 +10,7 @@ IMAGEC::IMAGEC(int w, int h, COLORSPACE space, int s, unsigned char* pixels) : c
         Realloc(w, h);
         return;
     }
-    width = w;
-    height = h;
-    stride = s;
-    data = pixels;
+    borrowPixels(*this, w, h, s, pixels);
 }
 
 IMAGEC::~IMAGEC()

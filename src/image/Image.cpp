@@ -13,10 +13,7 @@ IMAGE::IMAGE(int w, int h, int s, unsigned char* pixels)
         Realloc(w, h);
         return;
     }
-    width = w;
-    height = h;
-    stride = s;
-    data = pixels;
+    borrowPixels(*this, w, h, s, pixels);
 }
 
 IMAGE::IMAGE(int w, int h, int s, int channels, unsigned char* pixels)
@@ -41,10 +38,7 @@ IMAGE::IMAGE(int w, int h, int s, int channels, unsigned char* pixels)
         }
         return;
     }
-    width = w;
-    height = h;
-    stride = s;
-    data = pixels;
+    borrowPixels(*this, w, h, s, pixels);
 }
 
 IMAGE::~IMAGE()

@@ -14,4 +14,14 @@ bool growPixels(unsigned char*& data, int32_t& capacity, int64_t bytes);
 // Frees owned memory and nulls data; a borrowed pointer stays.
 void freePixels(unsigned char*& data, int32_t capacity);
 
+// Points an image at the caller's pixels, as they stand, without owning them.
+template <typename Image>
+void borrowPixels(Image& image, int width, int height, int stride, unsigned char* pixels)
+{
+    image.width = width;
+    image.height = height;
+    image.stride = stride;
+    image.data = pixels;
+}
+
 #endif
