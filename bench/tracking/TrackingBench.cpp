@@ -7,7 +7,7 @@
 
 #include <vector>
 
-#include "detector/FaceDetector.h"
+#include "engine/FaceDetector.h"
 #include "image/IntegralImage.h"
 #include "support/FaceDetectorRig.h"
 #include "support/FaceSequence.h"

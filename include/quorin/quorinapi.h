@@ -4,9 +4,16 @@
 /*
  * libquorinapi: on-device face detection and tracking, C entry points.
  *
- * One session per process, driven from one thread at a time (no entry is
- * thread-safe, quorin_init and quorin_release included). Frames are 8-bit
- * gray, width*height bytes without row padding.
+ * One session per process, meant to be driven from one thread at a time,
+ * quorin_init and quorin_release included. As a safety guard the session has
+ * one lock, held for the whole of every entry: calls from several threads at
+ * once run one after the other instead of corrupting the session. A
+ * quorin_release while another thread detects waits for that detection and
+ * then closes the session; calls after it behave as without a session. The
+ * guard gives no order between threads: a host that interleaves them still
+ * gets each thread's frames mixed with the others' (the orientation search and
+ * the tracker follow one stream of frames). Frames are 8-bit gray,
+ * width*height bytes without row padding.
  *
  * Result blocks. Every face is reported as a block of 17 ints at
  * results + 17*k, best score first:
@@ -33,8 +40,9 @@
  *     at once and touches nothing, whatever the arguments.
  *   throws: errors leave as C++ exceptions of the engine's runtime; a host
  *     that calls from C must not let one reach it (build the calling layer as
- *     C++ and catch there). The classes are declared in <quorin/Errors.h> and
- *     <quorin/ApiError.h>:
+ *     C++ and catch there, with a catch (const char*) beside catch (...)).
+ *     The classes are declared in <quorin/Errors.h> and <quorin/ApiError.h>.
+ *     This is everything that can leave a detect entry:
  *     - qv_invalid_argument, before any session state changes: a null
  *       `image` ("quorin: frame pointer is null"), width or height <= 0
  *       ("quorin: frame width and height must be positive"), width*height
@@ -43,10 +51,24 @@
  *     - ApiError "QVFace Detection API not initialized properly" in a session
  *       whose quorin_init failed;
  *     - ApiError "QVFace Detection API detect error" when the engine fails on
- *       the frame, "QVFace Detection API set face size range error" when it
- *       refuses the frame's face sizes, and, from the 360 entries, the mode
- *       errors of quorin_setDetectionMode;
- *     - std::bad_alloc when memory runs out.
+ *       the frame (a standard exception inside it, std::bad_alloc included),
+ *       "QVFace Detection API set face size range error" when it refuses the
+ *       frame's face sizes, and, from the 360 entries, the mode errors of
+ *       quorin_setDetectionMode;
+ *     - the C string "memory allocation failure" (a const char*, not an
+ *       exception object) when the image memory for a frame larger than any
+ *       before can't be had; the session stays usable;
+ *     - std::bad_alloc from the 360 tracking entries when the copy of a frame
+ *       larger than any before (above 1 MiB) can't be had;
+ *     - the C string "Error: Sid searched out of range!" (a const char*) if
+ *       the merging of hits ever found its links broken: a guard that no frame
+ *       is known to reach;
+ *     - std::invalid_argument "No value available for the input landmark" if
+ *       the landmark locator left a point out: a guard that the built-in
+ *       models never reach.
+ *     Every ApiError carries its text in a std::string: when the heap can't
+ *     even hold that, std::bad_alloc leaves in its place, from any entry but
+ *     quorin_release.
  */
 
 #include "quorin/export.h"
@@ -59,13 +81,18 @@ extern "C" {
  * ensures: an open session in mode 2, orientation unknown (-1). A session that
  *   is already open is closed first.
  * throws: ApiError "QVFace Detection API initialization error" when the models
- *   or the configuration can't be loaded; the session is then open but
- *   unusable (the detect entries raise "QVFace Detection API not initialized
- *   properly") until quorin_release or a new quorin_init. std::bad_alloc. */
+ *   or the configuration can't be loaded (memory for them included); the
+ *   session is then open but unusable (the detect entries raise "QVFace
+ *   Detection API not initialized properly") until quorin_release or a new
+ *   quorin_init. std::bad_alloc when the session's own buffers (under 2 MiB)
+ *   can't be had, with the same unusable session. The C string "memory
+ *   allocation failure" (a const char*) if image memory of the models can't
+ *   be had. Nothing else. */
 QUORIN_EXPORT void quorin_init(void);
 
 /* Closes the session and frees all its memory.
- * ensures: no session; without one this does nothing. Never throws. */
+ * ensures: no session; without one this does nothing. While another thread
+ *   is inside an entry, waits until that call has returned. Never throws. */
 QUORIN_EXPORT void quorin_release(void);
 
 /* Selects the detection mode: 0 fast (work frame long side 240, no tracker),
@@ -77,7 +104,8 @@ QUORIN_EXPORT void quorin_release(void);
  * throws: ApiError "QVFace Detection API not initialized properly" for a new
  *   mode 0..2 without a session; ApiError "QVFace Detection API set search
  *   step error" or "QVFace Detection API set mode error" in a session whose
- *   quorin_init failed. */
+ *   quorin_init failed (and the latter if the new tracker's memory can't be
+ *   had). Nothing else. */
 QUORIN_EXPORT void quorin_setDetectionMode(unsigned int mode);
 
 /* Detects faces in the frame turned clockwise by `rotation` (0, 90, 180, 270;
@@ -116,7 +144,8 @@ QUORIN_EXPORT int quorin_detect360HighScaled(unsigned char* image, int width, in
 /* As quorin_detect360TrackingScaled, then stores the orientation in use (0,
  * 90, 180, 270, or -1 after a search that found nothing) in *orientation.
  * Without a session it stores the last session's orientation (0 before any).
- * throws: qv_invalid_argument "quorin: orientation pointer is null" first. */
+ * throws: qv_invalid_argument "quorin: orientation pointer is null" first,
+ *   then what quorin_detect360TrackingScaled throws. */
 QUORIN_EXPORT int quorin_detect360TrackingScaled_ornt(unsigned char* image, int width, int height,
                                                       int* results, int maxFaces, int* orientation);
 

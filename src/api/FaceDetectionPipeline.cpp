@@ -8,8 +8,9 @@
 #include "core/ApiError.h"
 #include "core/Errors.h"
 #include "core/FaceModelPaths.h"
+#include "core/FaceModelPathsHandle.h"
 #include "core/Json.h"
-#include "detector/FaceDetector.h"
+#include "engine/FaceDetector.h"
 #include "faceparts/FacePartLocator.h"
 
 namespace {
@@ -35,7 +36,12 @@ void PipelineStages::init(const std::string& faceRects, const std::string& faceP
 }
 
 void setPipelineStagesOverride(PipelineStages* stages) { g_stagesOverride = stages; }
-PipelineStages* pipelineStagesOverride() { return g_stagesOverride; }
+
+FaceModelPaths pathsOf(const FaceModelPathsHandle& handle) {
+    FaceModelPaths paths;
+    paths.fromJson(handle.toJson());
+    return paths;
+}
 
 FaceDetectionPipeline::~FaceDetectionPipeline() { release(); }
 
@@ -86,23 +92,25 @@ void FaceDetectionPipeline::setFaceSizeRange(int minSize, int maxSize) {
     detector_->setFaceSizeRange(minSize, maxSize);
 }
 
-std::vector<FaceRecord> FaceDetectionPipeline::detect(const DetectionRequest& request) {
-    std::vector<FaceRecord> result;
-    std::vector<FaceData> faces;
+void FaceDetectionPipeline::detectFaces(const unsigned char* pixels, int width, int height,
+                                        std::vector<FaceData>& faces) {
+    faces.clear();
     PipelineStages* stages = g_stagesOverride;
     if (stages == nullptr) {
         requireEngine(detector_);
         requireEngine(locator_);
+        detector_->detect(pixels, width, height, faces);
+        if (!faces.empty()) locator_->locateParts(pixels, width, height, faces);
+        return;
     }
-    if (stages != nullptr)
-        stages->detect(request.pixels, request.width, request.height, faces);
-    else
-        detector_->detect(request.pixels, request.width, request.height, faces);
-    if (faces.empty()) return result;
-    if (stages != nullptr)
-        stages->locateParts(request.pixels, request.width, request.height, faces);
-    else
-        locator_->locateParts(request.pixels, request.width, request.height, faces);
+    stages->detect(pixels, width, height, faces);
+    if (!faces.empty()) stages->locateParts(pixels, width, height, faces);
+}
+
+std::vector<FaceRecord> FaceDetectionPipeline::detect(const DetectionRequest& request) {
+    std::vector<FaceData> faces;
+    detectFaces(request.pixels, request.width, request.height, faces);
+    std::vector<FaceRecord> result;
     result.reserve(faces.size());
     for (FaceData& face : faces) {
         face.setDataSet(request.dataSet);

@@ -5,11 +5,16 @@
 
 #include "api/DetectionRequest.h"
 #include "core/FaceRecord.h"
-#include "detector/FaceTrackingMode.h"
+#include "engine/FaceTrackingMode.h"
 
 class FaceDetector;
 class FacePartLocator;
 class FaceModelPaths;
+class FaceModelPathsHandle;
+
+// The configuration of a handle after one trip through its text form, so that
+// the record given to a pipeline is always a fresh one.
+FaceModelPaths pathsOf(const FaceModelPathsHandle& handle);
 
 // Owns the detector and the part locator and runs them on one frame, in that
 // order. Empty (both null) after construction, release and a failed init.
@@ -35,6 +40,9 @@ public:
     // Faces of one frame with landmarks and the request's dataSet/filePath.
     // The locator is not run on a frame without faces.
     std::vector<FaceRecord> detect(const DetectionRequest& request);
+    // The same faces as the engines leave them, in `faces` (cleared first),
+    // without dataSet and filePath: the frame path of the entry points.
+    void detectFaces(const unsigned char* pixels, int width, int height, std::vector<FaceData>& faces);
 
     bool ready() const { return staged_ || (detector_ != nullptr && locator_ != nullptr); }
 

@@ -5,7 +5,7 @@
 #include <vector>
 
 #include "core/FaceData.h"
-#include "detector/FaceTrackingMode.h"
+#include "engine/FaceTrackingMode.h"
 
 // A stand-in for the detector and the part locator of every pipeline. While
 // one is installed, FaceDetectionPipeline builds no engines and sends init,
@@ -27,6 +27,5 @@ public:
 
 // Installs `stages` (not owned) for all pipelines; null restores the engines.
 void setPipelineStagesOverride(PipelineStages* stages);
-PipelineStages* pipelineStagesOverride();
 
 #endif

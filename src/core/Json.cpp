@@ -1,5 +1,8 @@
 #include "core/Json.h"
 
+#include <cmath>
+#include <cstdio>
+#include <cstdlib>
 #include <deque>
 #include <sstream>
 
@@ -158,6 +161,14 @@ void JsonValue<float>::fromText(const std::string& text, float& value) {
     } catch (const std::exception&) {
         failRead();
     }
+}
+
+float roundToSixDigits(float value) {
+    if (!std::isfinite(value)) return 0.0f;
+    // "%g" is the stream's default form, and both read back through strtof.
+    char text[32];
+    std::snprintf(text, sizeof text, "%g", static_cast<double>(value));
+    return std::strtof(text, nullptr);
 }
 
 std::string JsonValue<std::string>::toText(const std::string& value) { return "\"" + value + "\""; }

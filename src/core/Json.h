@@ -77,6 +77,11 @@ struct JsonValue<std::string> {
     static void fromText(const std::string& text, std::string& value);
 };
 
+// The float that `value` becomes through its text form (six significant
+// digits, read back), without making the text on the heap. Infinities and NaN
+// read back as 0, as the codec reads them.
+float roundToSixDigits(float value);
+
 // Landmark maps: declared here, defined next to Point2 by the records.
 template <typename T>
 class Point2;

@@ -2,6 +2,8 @@
 
 #include <stdexcept>
 
+const char* const kNoLandmarkValue = "No value available for the input landmark";
+
 std::string JsonValue<std::map<std::string, Point2<float>>>::toText(
     const std::map<std::string, Point2<float>>& value) {
     std::string text = "{";
@@ -31,7 +33,7 @@ void JsonValue<std::map<std::string, Point2<float>>>::fromText(const std::string
 
 Point2<float> LandmarkMap::landmark(const std::string& name) const {
     auto it = points_.find(name);
-    if (it == points_.end()) throw std::invalid_argument("No value available for the input landmark");
+    if (it == points_.end()) throw std::invalid_argument(kNoLandmarkValue);
     return it->second;
 }
 

@@ -6,4 +6,7 @@
 #include "core/Point2.h"
 #include "quorin/LandmarkMap.h"
 
+// "No value available for the input landmark": a name that holds no point.
+extern const char* const kNoLandmarkValue;
+
 #endif

@@ -102,8 +102,6 @@ public:
     static void TxferLayer(uint32_t type, int32_t* values, uint32_t count, uint16_t divisor, uint32_t* bestClass);
 
     // Table access (little-endian reads out of the blob).
-    uint16_t Version() const { return tables.version; }
-    uint16_t LayerCount() const { return tables.layerCount; }
     uint16_t LayerSize(uint32_t layer) const;
     uint32_t TransferType(uint32_t layer) const;
 

@@ -1,7 +1,8 @@
 #include "image/ColorImage.h"
 
-#include <cstdlib>
 #include <limits>
+
+#include "image/PixelMemory.h"
 
 IMAGEC::IMAGEC(int w, int h, COLORSPACE space, int s, unsigned char* pixels) : colorspace(space)
 {
@@ -9,10 +10,7 @@ IMAGEC::IMAGEC(int w, int h, COLORSPACE space, int s, unsigned char* pixels) : c
         Realloc(w, h);
         return;
     }
-    width = w;
-    height = h;
-    stride = s;
-    data = pixels;
+    borrowPixels(*this, w, h, s, pixels);
 }
 
 IMAGEC::~IMAGEC()
@@ -30,22 +28,12 @@ void IMAGEC::Realloc(int w, int h)
     stride = static_cast<int32_t>(newStride);
     width = w;
     height = h;
-    if (bytes > capacity) {
-        unsigned char* fresh = static_cast<unsigned char*>(std::malloc(static_cast<size_t>(bytes)));
-        if (fresh == nullptr)
-            throw "memory allocation failure";
-        if (capacity > 0)
-            std::free(data);
-        data = fresh;
-        capacity = static_cast<int32_t>(bytes);
-    }
+    if (!growPixels(data, capacity, bytes))
+        throw "memory allocation failure";
 }
 
 void IMAGEC::Release()
 {
-    if (capacity > 0) {
-        std::free(data);
-        data = nullptr;
-    }
+    freePixels(data, capacity);
     width = height = stride = capacity = 0;
 }

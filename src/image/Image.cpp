@@ -5,16 +5,15 @@
 #include <cstring>
 #include <limits>
 
+#include "image/PixelMemory.h"
+
 IMAGE::IMAGE(int w, int h, int s, unsigned char* pixels)
 {
     if (pixels == nullptr) {
         Realloc(w, h);
         return;
     }
-    width = w;
-    height = h;
-    stride = s;
-    data = pixels;
+    borrowPixels(*this, w, h, s, pixels);
 }
 
 IMAGE::IMAGE(int w, int h, int s, int channels, unsigned char* pixels)
@@ -39,10 +38,7 @@ IMAGE::IMAGE(int w, int h, int s, int channels, unsigned char* pixels)
         }
         return;
     }
-    width = w;
-    height = h;
-    stride = s;
-    data = pixels;
+    borrowPixels(*this, w, h, s, pixels);
 }
 
 IMAGE::~IMAGE()
@@ -62,16 +58,9 @@ bool IMAGE::Realloc(int w, int h)
         Release();
         return false;
     }
-    if (bytes > capacity) {
-        unsigned char* fresh = static_cast<unsigned char*>(std::malloc(static_cast<size_t>(bytes)));
-        if (fresh == nullptr) {
-            Release();
-            return false;
-        }
-        if (capacity > 0)
-            std::free(data);
-        data = fresh;
-        capacity = static_cast<int32_t>(bytes);
+    if (!growPixels(data, capacity, bytes)) {
+        Release();
+        return false;
     }
     width = w;
     height = h;
@@ -81,10 +70,7 @@ bool IMAGE::Realloc(int w, int h)
 
 void IMAGE::Release()
 {
-    if (capacity > 0) {
-        std::free(data);
-        data = nullptr;
-    }
+    freePixels(data, capacity);
     width = stride = height = capacity = 0;
 }
 

@@ -1,3 +1,4 @@
+#include "core/CreateFromText.h"
 #include "numeric/FilterCreate.h"
 #include "quorin/Filter1D.h"
 
@@ -83,7 +84,7 @@ void GaussianFilter1D::filterAtImpl(const float* data, int n, int stride, int in
                 kernel_[centre - j];
 }
 
-GaussianFilter1D* GaussianFilter1D::create(const std::string& text) { return filter_create::createFrom<GaussianFilter1D>(text); }
+GaussianFilter1D* GaussianFilter1D::create(const std::string& text) { return createFromText<GaussianFilter1D>(text); }
 
 Filter1D* GaussianFilter1D::clone() const { return filter_create::cloneOf<Filter1D>(*this); }
 
@@ -157,7 +158,7 @@ void DoGFilter1D::filterAtImpl(const float* data, int n, int stride, int index, 
     *out = higher - lower;
 }
 
-DoGFilter1D* DoGFilter1D::create(const std::string& text) { return filter_create::createFrom<DoGFilter1D>(text); }
+DoGFilter1D* DoGFilter1D::create(const std::string& text) { return createFromText<DoGFilter1D>(text); }
 
 Filter1D* DoGFilter1D::clone() const { return filter_create::cloneOf<Filter1D>(*this); }
 

@@ -1,3 +1,4 @@
+#include "core/CreateFromText.h"
 #include "numeric/FilterCreate.h"
 #include "quorin/Filter2D.h"
 
@@ -95,7 +96,7 @@ void GaussianFilter2D::init(float sigmaHorizontal, float sigmaVertical) {
     verticalFilter_.reset(new GaussianFilter1D(sigmaVertical));
 }
 
-GaussianFilter2D* GaussianFilter2D::create(const std::string& text) { return filter_create::createFrom<GaussianFilter2D>(text); }
+GaussianFilter2D* GaussianFilter2D::create(const std::string& text) { return createFromText<GaussianFilter2D>(text); }
 
 Filter2D* GaussianFilter2D::clone() const { return filter_create::cloneOf<Filter2D>(*this); }
 
@@ -167,7 +168,7 @@ void DoGFilter2D::filter(const float* src, int width, int height, int srcStride,
     }
 }
 
-DoGFilter2D* DoGFilter2D::create(const std::string& text) { return filter_create::createFrom<DoGFilter2D>(text); }
+DoGFilter2D* DoGFilter2D::create(const std::string& text) { return createFromText<DoGFilter2D>(text); }
 
 Filter2D* DoGFilter2D::clone() const { return filter_create::cloneOf<Filter2D>(*this); }
 

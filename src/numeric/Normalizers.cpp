@@ -5,21 +5,9 @@
 
 #include "core/Errors.h"
 #include "core/Json.h"
+#include "core/CreateFromText.h"
 
 namespace {
-
-template <typename N>
-N* createFrom(const std::string& text) {
-    N* normalizer = nullptr;
-    try {
-        normalizer = new N();
-        normalizer->fromJson(text);
-        return normalizer;
-    } catch (const std::exception&) {
-        delete normalizer;
-        return nullptr;
-    }
-}
 
 // The three schemes without parameters take only the empty object.
 void readNoParameters(const std::string& text) {
@@ -54,7 +42,7 @@ void QVL1Normalizer::normalize(const float* input, unsigned int length, float* o
 std::string QVL1Normalizer::name() const { return "QV_NORMALIZER_L1"; }
 std::string QVL1Normalizer::toJson() const { return "{}"; }
 void QVL1Normalizer::fromJson(const std::string& text) { readNoParameters(text); }
-QVL1Normalizer* QVL1Normalizer::create(const std::string& text) { return createFrom<QVL1Normalizer>(text); }
+QVL1Normalizer* QVL1Normalizer::create(const std::string& text) { return createFromText<QVL1Normalizer>(text); }
 
 // ---------------------------------------------------------------------------
 void QVL2Normalizer::normalize(const float* input, unsigned int length, float* output) const {
@@ -66,7 +54,7 @@ void QVL2Normalizer::normalize(const float* input, unsigned int length, float* o
 std::string QVL2Normalizer::name() const { return "QV_NORMALIZER_L2"; }
 std::string QVL2Normalizer::toJson() const { return "{}"; }
 void QVL2Normalizer::fromJson(const std::string& text) { readNoParameters(text); }
-QVL2Normalizer* QVL2Normalizer::create(const std::string& text) { return createFrom<QVL2Normalizer>(text); }
+QVL2Normalizer* QVL2Normalizer::create(const std::string& text) { return createFromText<QVL2Normalizer>(text); }
 
 // ---------------------------------------------------------------------------
 void QVL1SqrtNormalizer::normalize(const float* input, unsigned int length, float* output) const {
@@ -76,7 +64,7 @@ std::string QVL1SqrtNormalizer::name() const { return "QV_NORMALIZER_L1SQRT"; }
 std::string QVL1SqrtNormalizer::toJson() const { return "{}"; }
 void QVL1SqrtNormalizer::fromJson(const std::string& text) { readNoParameters(text); }
 QVL1SqrtNormalizer* QVL1SqrtNormalizer::create(const std::string& text) {
-    return createFrom<QVL1SqrtNormalizer>(text);
+    return createFromText<QVL1SqrtNormalizer>(text);
 }
 
 // ---------------------------------------------------------------------------
@@ -95,4 +83,4 @@ void QVL2HysNormalizer::fromJson(const std::string& text) {
     jsonObjectItemToNamedValue(items, "clipThreshold", clipThreshold_);
     jsonObjectItemToNamedValue(items, "alpha", alpha_);
 }
-QVL2HysNormalizer* QVL2HysNormalizer::create(const std::string& text) { return createFrom<QVL2HysNormalizer>(text); }
+QVL2HysNormalizer* QVL2HysNormalizer::create(const std::string& text) { return createFromText<QVL2HysNormalizer>(text); }

@@ -1,5 +1,7 @@
 #include "postfilter/ILabsPostFilter.h"
 
+#include "core/CreateFromText.h"
+
 ILabsPostFilter::ILabsPostFilter() : LbpPatchFilter(false) {}
 
 ILabsPostFilter::ILabsPostFilter(const std::string& path) : ILabsPostFilter()
@@ -9,7 +11,7 @@ ILabsPostFilter::ILabsPostFilter(const std::string& path) : ILabsPostFilter()
 
 PostFilter* ILabsPostFilter::create(const std::string& parameters)
 {
-    return createConfigured<ILabsPostFilter>(parameters);
+    return createFromText<ILabsPostFilter>(parameters);
 }
 
 std::string ILabsPostFilter::name() const

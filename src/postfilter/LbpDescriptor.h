@@ -20,8 +20,6 @@ public:
     LbpDescriptor(int cellsX, int cellsY);
     void init(int cellsX, int cellsY);
 
-    int getCellsX() const { return cellsX; }
-    int getCellsY() const { return cellsY; }
     // Number of histogram values getFeature writes: cellsX * cellsY * 59.
     int getLength() const { return length; }
 

@@ -32,8 +32,6 @@ public:
     // histogram of its window cropped and scaled to 24 x 24.
     std::vector<float> feature(IN_IMAGE const& image, ScoredWindow const& hit) const;
 
-    const LbpDescriptor& getDescriptor() const { return descriptor; }
-
 protected:
     // transposedPatch: the model was made on the patch read column by column.
     explicit LbpPatchFilter(bool transposedPatch);
@@ -42,20 +40,6 @@ protected:
     // Hits that pass without their feature being computed.
     virtual bool passesUnjudged(ScoredWindow const&) const { return false; }
     virtual bool judge(ScoredWindow const& hit, const float* values, int count) const = 0;
-
-    // A new filter configured from `parameters`, or null when a std::exception
-    // is raised on the way (malformed text, unknown or bad model).
-    template <class Filter>
-    static PostFilter* createConfigured(const std::string& parameters)
-    {
-        std::unique_ptr<Filter> filter(new Filter());
-        try {
-            filter->fromJson(parameters);
-        } catch (const std::exception&) {
-            return nullptr;
-        }
-        return filter.release();
-    }
 
 private:
     void extract(IN_IMAGE const& image, ScoredWindow const& hit, IMAGE& patch, float* pixels, float* out) const;

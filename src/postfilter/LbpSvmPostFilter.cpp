@@ -1,5 +1,7 @@
 #include "postfilter/LbpSvmPostFilter.h"
 
+#include "core/CreateFromText.h"
+
 #include "container/ModelReader.h"
 
 LbpSvmPostFilter::LbpSvmPostFilter() : LbpPatchFilter(true) {}
@@ -11,7 +13,7 @@ LbpSvmPostFilter::LbpSvmPostFilter(const std::string& path) : LbpSvmPostFilter()
 
 PostFilter* LbpSvmPostFilter::create(const std::string& parameters)
 {
-    return createConfigured<LbpSvmPostFilter>(parameters);
+    return createFromText<LbpSvmPostFilter>(parameters);
 }
 
 std::string LbpSvmPostFilter::name() const

@@ -21,9 +21,6 @@ public:
     // Without a model every hit raises qv_unsupported_error.
     std::string name() const override;
 
-    SvmClassifier& getPrimaryClassifier() { return primaryClassifier; }
-    SvmClassifier& getSecondaryClassifier() { return secondaryClassifier; }
-
 private:
     void loadModel(const std::string& modelPath) override;
     bool judge(ScoredWindow const& hit, const float* values, int count) const override;

@@ -8,6 +8,22 @@
 
 namespace pm = postfilter_model;
 
+namespace {
+
+// The sum of the per-class support vector counts, none of them negative.
+long long countedSupportVectors(const std::vector<int32_t>& counts)
+{
+    long long sum = 0;
+    for (int32_t n : counts) {
+        if (n < 0)
+            throw qv_data_error("SVM model support vector count out of range");
+        sum += n;
+    }
+    return sum;
+}
+
+}  // namespace
+
 SvmClassifier::SvmClassifier(ModelReader& reader)
 {
     init(reader);
@@ -39,13 +55,7 @@ void SvmClassifier::init(ModelReader& reader)
         || m.featureLength > MAX_SUPPORT_VALUES
         || static_cast<long long>(m.svTotal) * m.featureLength > MAX_SUPPORT_VALUES)
         throw qv_data_error("SVM model support vector table out of range");
-    long long listed = 0;
-    for (int32_t n : m.svCounts) {
-        if (n < 0)
-            throw qv_data_error("SVM model support vector count out of range");
-        listed += n;
-    }
-    if (listed != m.svTotal)
+    if (countedSupportVectors(m.svCounts) != m.svTotal)
         throw qv_data_error("SVM model support vector counts do not add up");
     const int32_t nonZeroCount = pm::readInt32(reader);
     // The entries and the coefficient rows that follow must both be there
@@ -76,13 +86,7 @@ void SvmClassifier::check(const SvmModel& m)
     if (k < 1 || m.rho.size() != pairs || m.decisionThresholds.size() != pairs
         || m.labels.size() != static_cast<std::size_t>(k) || m.svCounts.size() != static_cast<std::size_t>(k))
         throw qv_data_error("SVM model class tables do not match its class count");
-    long long sum = 0;
-    for (int32_t n : m.svCounts) {
-        if (n < 0)
-            throw qv_data_error("SVM model support vector count out of range");
-        sum += n;
-    }
-    if (sum != m.svTotal || m.supportVectors.size() != static_cast<std::size_t>(m.svTotal))
+    if (countedSupportVectors(m.svCounts) != m.svTotal || m.supportVectors.size() != static_cast<std::size_t>(m.svTotal))
         throw qv_data_error("SVM model support vector counts do not add up");
     for (const auto& sv : m.supportVectors)
         if (sv.size() != static_cast<std::size_t>(m.featureLength))

@@ -42,7 +42,6 @@ public:
     void init(ModelReader& reader);
     // Test use: takes a model given as values, after the same consistency checks.
     void setModel(SvmModel model);
-    const SvmModel& getModel() const { return model; }
 
     // Label of the class with the most pairwise votes (ties: the lower class).
     // Throws qv_data_error("Incorrect PostFilter's feature length") when length

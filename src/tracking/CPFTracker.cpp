@@ -1,5 +1,7 @@
 #include "tracking/CPFTracker.h"
 
+#include "core/CreateFromText.h"
+
 #include "core/Errors.h"
 #include "tracking/ParticleRandom.h"
 
@@ -23,20 +25,16 @@ void CPFTracker::update(const IN_IMAGE& image, const std::vector<DetectionWindow
     const size_t n = lastPredicted.size();
     const size_t m = detections.size();
 
-    std::vector<std::vector<float>> scores(m, std::vector<float>(n, 0.0f));
-    for (size_t j = 0; j < n; ++j) {
-        if (!cascades.isAlive(j)) continue;
-        for (size_t i = 0; i < m; ++i) scores[i][j] = detections[i].Overlap(lastPredicted[j]);
-    }
-
-    std::vector<int> assignment;
-    match(scores, &assignment);
+    // Scored on the last prediction, with no overlap bound.
+    const std::vector<int> assignment = matchDetections(
+        detections, n, [&](size_t j) { return cascades.isAlive(j); }, [&](size_t j) { return lastPredicted[j]; },
+        false);
 
     // A new face may land in a slot beyond the n predicted ones (an update
     // without a predict has n of 0), so seen covers every slot there is.
     std::vector<bool> seen(cascades.size() + m, false);
     for (size_t i = 0; i < m; ++i) {
-        int j = i < assignment.size() ? assignment[i] : -1;
+        int j = assignment[i];
         if (j < 0) {
             if (detector == nullptr)
                 throw qv_operation_error("Cascade particle filter tracker doesn't have a detector yet");
@@ -49,8 +47,7 @@ void CPFTracker::update(const IN_IMAGE& image, const std::vector<DetectionWindow
     }
 
     // As in the simple tracker, dead slots are stacked again every frame.
-    for (size_t j = 0; j < cascades.size(); ++j)
-        if (!seen[j]) cascades.remove(uint32_t(j));
+    removeUnseen(cascades, seen, false);
     cascades.boundFreeSlots();
     // The windows belong to the predict just answered: the next update
     // without a predict of its own matches nothing and opens a face per
@@ -62,4 +59,4 @@ void CPFTracker::update(const IN_IMAGE& image, const std::vector<DetectionWindow
 
 std::string CPFTracker::name() const { return "CPF_TRACKER"; }
 
-Tracker* CPFTracker::create(const std::string& parameters) { return createAs<CPFTracker>(parameters); }
+Tracker* CPFTracker::create(const std::string& parameters) { return createFromText<CPFTracker>(parameters); }

@@ -1,5 +1,7 @@
 #include "tracking/KFTracker.h"
 
+#include "core/CreateFromText.h"
+
 #include <cmath>
 #include <cstdint>
 #include <exception>
@@ -97,30 +99,25 @@ void KFTracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& dete
     const size_t n = kfFaces.size();
 
     // Scores on the truncated state; predict reports the rounded one.
-    std::vector<std::vector<float>> scores(m, std::vector<float>(n, 0.0f));
-    for (size_t j = 0; j < n; ++j) {
-        if (!kfFaces.alive[j]) continue;
-        const Eigen::VectorXf& s = kfFaces.items[j].state;
-        DetectionWindow w{};
-        w.left = toInt(s[0]);
-        w.right = toInt(s[2]);
-        w.top = toInt(s[1]);
-        w.bottom = toInt(s[3]);
-        for (size_t i = 0; i < m; ++i) {
-            const float v = detections[i].Overlap(w);
-            scores[i][j] = double(v) < kMinOverlap ? 0.0f : v;
-        }
-    }
-
-    std::vector<int> assignment;
-    match(scores, &assignment);
+    const std::vector<int> assignment = matchDetections(
+        detections, n, [&](size_t j) { return bool(kfFaces.alive[j]); },
+        [&](size_t j) {
+            const Eigen::VectorXf& s = kfFaces.items[j].state;
+            DetectionWindow w{};
+            w.left = toInt(s[0]);
+            w.right = toInt(s[2]);
+            w.top = toInt(s[1]);
+            w.bottom = toInt(s[3]);
+            return w;
+        },
+        true);
 
     std::vector<bool> seen(n + m, false);
     for (size_t i = 0; i < m; ++i) {
         const DetectionWindow& d = detections[i];
         Eigen::VectorXf z(4);
         z << float(d.left), float(d.top), float(d.right), float(d.bottom);
-        const int j = i < assignment.size() ? assignment[i] : -1;
+        const int j = assignment[i];
         if (j < 0) {
             TrackFace f;
             f.state.head(4) = z;
@@ -141,12 +138,11 @@ void KFTracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& dete
 
     // Unlike the simple tracker, only live slots are freed, so each index
     // stands on the free stack at most once.
-    for (size_t j = 0; j < kfFaces.size(); ++j)
-        if (kfFaces.alive[j] && (j >= seen.size() || !seen[j])) kfFaces.remove(uint32_t(j));
+    removeUnseen(kfFaces, seen, true);
 
     ++frameCounter;
 }
 
 std::string KFTracker::name() const { return "KF_TRACKER"; }
 
-Tracker* KFTracker::create(const std::string& parameters) { return createAs<KFTracker>(parameters); }
+Tracker* KFTracker::create(const std::string& parameters) { return createFromText<KFTracker>(parameters); }

@@ -1,5 +1,7 @@
 #include "tracking/PFTracker.h"
 
+#include "core/CreateFromText.h"
+
 #include "tracking/ParticleCloud.h"
 #include "tracking/ParticleRandom.h"
 
@@ -64,22 +66,13 @@ void PFTracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& dete
     const size_t m = detections.size();
     const size_t n = pfFaces.size();
 
-    std::vector<std::vector<float>> scores(m, std::vector<float>(n, 0.0f));
-    for (size_t j = 0; j < n; ++j) {
-        if (!pfFaces.alive[j]) continue;
-        const DetectionWindow mean = pfFaces.items[j].mean();
-        for (size_t i = 0; i < m; ++i) {
-            const float s = detections[i].Overlap(mean);
-            scores[i][j] = double(s) < kMinOverlap ? 0.0f : s;
-        }
-    }
-
-    std::vector<int> assignment;
-    match(scores, &assignment);
+    const std::vector<int> assignment = matchDetections(
+        detections, n, [&](size_t j) { return bool(pfFaces.alive[j]); },
+        [&](size_t j) { return pfFaces.items[j].mean(); }, true);
 
     std::vector<bool> seen(n + m, false);
     for (size_t i = 0; i < m; ++i) {
-        const int j = i < assignment.size() ? assignment[i] : -1;
+        const int j = assignment[i];
         if (j >= 0) {
             pfFaces.items[size_t(j)].setObservation(detections[i]);
             seen[size_t(j)] = true;
@@ -90,8 +83,7 @@ void PFTracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& dete
     }
 
     // As in the simple tracker, dead slots are stacked again every frame.
-    for (size_t j = 0; j < pfFaces.size(); ++j)
-        if (j >= seen.size() || !seen[j]) pfFaces.remove(uint32_t(j));
+    removeUnseen(pfFaces, seen, false);
     pfFaces.boundFreeSlots();
 
     ++frameCounter;
@@ -99,4 +91,4 @@ void PFTracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& dete
 
 std::string PFTracker::name() const { return "PF_TRACKER"; }
 
-Tracker* PFTracker::create(const std::string& parameters) { return createAs<PFTracker>(parameters); }
+Tracker* PFTracker::create(const std::string& parameters) { return createFromText<PFTracker>(parameters); }

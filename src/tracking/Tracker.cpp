@@ -1,5 +1,7 @@
 #include "tracking/Tracker.h"
 
+#include "core/CreateFromText.h"
+
 #include <cstdint>
 #include <exception>
 #include <new>
@@ -85,22 +87,14 @@ void Tracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& detect
 {
     const size_t m = detections.size();
     const size_t n = faces.size();
-
-    std::vector<std::vector<float>> scores(m, std::vector<float>(n, 0.0f));
-    for (size_t i = 0; i < m; ++i)
-        for (size_t j = 0; j < n; ++j) {
-            if (!faces.alive[j]) continue;
-            const float s = detections[i].Overlap(faces.items[j].rect);
-            scores[i][j] = double(s) < kMinOverlap ? 0.0f : s;
-        }
-
-    std::vector<int> assignment;
-    match(scores, &assignment);
+    const std::vector<int> assignment = matchDetections(
+        detections, n, [&](size_t j) { return bool(faces.alive[j]); }, [&](size_t j) { return faces.items[j].rect; },
+        true);
 
     std::vector<bool> seen(n + m, false);
     for (size_t i = 0; i < m; ++i) {
         const DetectionWindow& d = detections[i];
-        const int j = i < assignment.size() ? assignment[i] : -1;
+        const int j = assignment[i];
         if (j >= 0) {
             TrackFace& f = faces.items[size_t(j)];
             f.velocityX = centreShift(d.left, d.right, f.rect.left, f.rect.right);
@@ -117,8 +111,7 @@ void Tracker::update(const IN_IMAGE&, const std::vector<DetectionWindow>& detect
 
     // No grace period, and no look at the alive flag: a slot already dead is
     // stacked again, so two new faces of one later frame may share a slot.
-    for (size_t j = 0; j < faces.size(); ++j)
-        if (j >= seen.size() || !seen[j]) faces.remove(uint32_t(j));
+    removeUnseen(faces, seen, false);
 
     ++frameCounter;
 }
@@ -129,4 +122,4 @@ void Tracker::fromJson(const std::string&) {}
 
 std::string Tracker::name() const { return "SIMPLE_TRACKER"; }
 
-Tracker* Tracker::create(const std::string& parameters) { return createAs<Tracker>(parameters); }
+Tracker* Tracker::create(const std::string& parameters) { return createFromText<Tracker>(parameters); }

@@ -52,24 +52,41 @@ public:
     QVArrayList<TrackFace> faces;
 
 protected:
-    // The body of every tracker's create: null when construction or fromJson
-    // throws a standard exception.
-    template <typename T>
-    static Tracker* createAs(const std::string& parameters)
-    {
-        Tracker* t = nullptr;
-        try {
-            t = new T();
-            t->fromJson(parameters);
-        } catch (const std::exception&) {
-            delete t;
-            return nullptr;
-        }
-        return t;
-    }
-
     // Overlap below this is no evidence of the same face.
     static constexpr double kMinOverlap = 0.3;
+
+    // The matching half of every update: detection i is scored against the
+    // window `windowOf(j)` of each of the n slots for which `alive(j)` holds,
+    // by their overlap, cut to 0 below kMinOverlap when `cut`. Returns one
+    // entry per detection: the slot it continues, or -1 for a new face.
+    template <typename Alive, typename WindowOf>
+    static std::vector<int> matchDetections(const std::vector<DetectionWindow>& detections, size_t n, Alive alive,
+                                            WindowOf windowOf, bool cut)
+    {
+        const size_t m = detections.size();
+        std::vector<std::vector<float>> scores(m, std::vector<float>(n, 0.0f));
+        for (size_t j = 0; j < n; ++j) {
+            if (!alive(j)) continue;
+            const DetectionWindow w = windowOf(j);
+            for (size_t i = 0; i < m; ++i) {
+                const float s = detections[i].Overlap(w);
+                scores[i][j] = cut && double(s) < kMinOverlap ? 0.0f : s;
+            }
+        }
+        std::vector<int> assignment;
+        match(scores, &assignment);
+        assignment.resize(m, -1);
+        return assignment;
+    }
+
+    // The closing half: every slot that no detection of this frame marked in
+    // `seen` is removed; with `liveOnly` only the slots still alive.
+    template <typename T>
+    static void removeUnseen(QVArrayList<T>& list, const std::vector<bool>& seen, bool liveOnly)
+    {
+        for (size_t j = 0; j < list.size(); ++j)
+            if ((!liveOnly || list.alive[j]) && (j >= seen.size() || !seen[j])) list.remove(uint32_t(j));
+    }
 };
 
 #endif

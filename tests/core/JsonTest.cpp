@@ -1,5 +1,8 @@
 #include <gtest/gtest.h>
 
+#include <cstdint>
+#include <cstring>
+#include <limits>
 #include <random>
 #include <stdexcept>
 
@@ -69,6 +72,33 @@ TEST(JsonValues, NumbersIgnoreWhatFollowsAndStringsNeedQuotes) {
     for (const char* text : {"", "\"", "x", "\"x", "x\""}) {
         EXPECT_THROW(JsonValue<std::string>::fromText(text, s), JsonError) << text;
         EXPECT_EQ(s, "keep");
+    }
+}
+
+// The frame path rounds a face's floats without making text; hosts must get
+// bit for bit the floats that the text form gave them.
+TEST(JsonValues, SixDigitRoundingIsTheFloatsTripThroughItsText) {
+    std::vector<float> values = {0.0f, -0.0f, 100.49999f, 0.1234561f, 999999.5f, 9999995.0f, 1e-40f,
+                                 std::numeric_limits<float>::max(), std::numeric_limits<float>::lowest(),
+                                 std::numeric_limits<float>::min(), std::numeric_limits<float>::denorm_min(),
+                                 std::numeric_limits<float>::infinity(), -std::numeric_limits<float>::infinity(),
+                                 std::numeric_limits<float>::quiet_NaN()};
+    std::mt19937 random(25);
+    for (int i = 0; i < 100000; ++i) {
+        const uint32_t bits = static_cast<uint32_t>(random());
+        float v;
+        std::memcpy(&v, &bits, sizeof v);
+        values.push_back(v);
+        values.push_back(static_cast<float>(random() % 2000000) / 1000.0f);  // pixel-like values
+    }
+    for (float v : values) {
+        float viaText = -1.0f;
+        JsonValue<float>::fromText(JsonValue<float>::toText(v), viaText);
+        const float rounded = roundToSixDigits(v);
+        uint32_t a, b;
+        std::memcpy(&a, &viaText, sizeof a);
+        std::memcpy(&b, &rounded, sizeof b);
+        ASSERT_EQ(a, b) << JsonValue<float>::toText(v);
     }
 }
 

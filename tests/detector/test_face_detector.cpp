@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "core/Errors.h"
-#include "detector/FaceDetector.h"
+#include "engine/FaceDetector.h"
 #include "support/ExpectThrow.h"
 #include "support/FaceDetectorRig.h"
 #include "support/TrackSupport.h"

@@ -1,5 +1,5 @@
-#ifndef QUORIN_DETECTOR_FACEDETECTOR_H
-#define QUORIN_DETECTOR_FACEDETECTOR_H
+#ifndef QUORIN_ENGINE_FACEDETECTOR_H
+#define QUORIN_ENGINE_FACEDETECTOR_H
 
 // The declaration is public (<quorin/FaceDetector.h>); the engine also needs
 // the window types that the public header only names.

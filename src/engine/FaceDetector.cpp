@@ -1,4 +1,4 @@
-#include "detector/FaceDetector.h"
+#include "engine/FaceDetector.h"
 
 #include <algorithm>
 #include <map>
