@@ -21,6 +21,21 @@
 //       pass threshold of stage I (from 0) to V: trading a little recall
 //       for fewer features per window, measured with `measure`.
 //
+//   train_cascade joint-train --boxes TSV --negatives LIST --work DIR
+//                         [--common-stages N] [--branch-stages N] [--band LO:HI] [--minutes M]
+//       The roll cascade (tools/lib/BranchTrainer.h): common stages scoring
+//       the upright and the two turned categories, then an upright branch and
+//       a clockwise one (mirrored for counter-clockwise). Positives are the
+//       training photos turned about the face centre (upright within
+//       --upright-roll, turned within the band). Resumes from WORK/joint.txt.
+//   train_cascade joint-model --work DIR --out FILE [--branch-stages N] [--bias B] [--raise K:D,...]
+//       The engine payload of a joint-train state.
+//   train_cascade roll-measure --boxes TSV [--limit N] [--angles A,...] [--modes M,...]
+//       Faces found and mean roll error on report photos turned about the face
+//       centre, through quorin_detect.
+//   measure and roll-measure take --model, --mdpb and --mdnb: candidate
+//   payloads served in place of the built-in "mdcb", "mdpb" and "mdnb".
+//
 // Lists: the negatives list has one image path and "train" or "report" per
 // line (tab separated). Deterministic for a given --seed.
 
@@ -572,6 +587,24 @@ void positiveSamples(std::vector<FaceRow> const& rows, TrainConfig const& cfg, d
     }
 }
 
+// The engine's exhaustive search over a whole frame at one step, faces from
+// `minSize` up to the frame's short side; false when the image can't be made.
+bool searchWhole(CascadeDetector& d, Gray const& g, float step, int minSize, IN_IMAGE& image,
+                 std::vector<ScoredWindow>& hits)
+{
+    d.setSearchStep(step, step);
+    d.setFaceSizeRange(minSize, std::min(g.width, g.height));
+    if (!image.Init(g.width, g.height, g.width, g.pixels.data()))
+        return false;
+    DetectionWindow whole;
+    whole.left = 0;
+    whole.top = 0;
+    whole.right = g.width;
+    whole.bottom = g.height;
+    d.exhaustiveDetect(image, {whole}, &hits);
+    return true;
+}
+
 struct Miner {
     std::vector<Gray> images;
     // Face photos with their face: hits that overlap the face but don't frame
@@ -645,18 +678,10 @@ struct Miner {
                     if (minSide < 32)
                         continue;
                     CascadeDetector& d = *detectors[static_cast<size_t>(t)];
-                    d.setSearchStep(v.step, v.step);
-                    d.setFaceSizeRange(24, minSide);
                     IN_IMAGE image;
-                    if (!image.Init(g.width, g.height, g.width, g.pixels.data()))
-                        continue;
-                    DetectionWindow whole;
-                    whole.left = 0;
-                    whole.top = 0;
-                    whole.right = g.width;
-                    whole.bottom = g.height;
                     std::vector<ScoredWindow> hits;
-                    d.exhaustiveDetect(image, {whole}, &hits);
+                    if (!searchWhole(d, g, v.step, 24, image, hits))
+                        continue;
                     searched[b] = hits.size();
                     std::mt19937_64 r(v.seed);
                     std::shuffle(hits.begin(), hits.end(), r);
@@ -938,20 +963,40 @@ void searchCost(CascadeDetector& d, Gray const& frame, int longSide, float step,
     }
 }
 
+// Candidate payloads served in place of the built-in ones for a measurement:
+// --model (the cascade, "mdcb"), --mdpb (post filter), --mdnb (landmark net).
+struct Served {
+    std::map<std::string, std::vector<uint8_t>> packed;
+    bool serve(std::map<std::string, std::string> const& a)
+    {
+        for (auto const& [key, name] : {std::pair<const char*, const char*>{"--model", "mdcb"}, {"--mdpb", "mdpb"},
+                                        {"--mdnb", "mdnb"}}) {
+            const std::string path = get(a, key);
+            if (path.empty())
+                continue;
+            std::ifstream in(path, std::ios::binary);
+            const std::vector<uint8_t> payload{std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+            if (payload.empty()) {
+                std::cerr << "cannot read " << path << "\n";
+                return false;
+            }
+            std::vector<uint8_t>& p = packed[name] = packRawModel(payload);
+            ModelRegistry::instance().registerModel(name, p.data(), p.data() + p.size());
+        }
+        return true;
+    }
+    ~Served()
+    {
+        for (auto const& entry : packed)
+            ModelRegistry::instance().unregisterModel(entry.first);
+    }
+};
+
 int commandMeasure(std::map<std::string, std::string> const& a)
 {
-    std::vector<uint8_t> payload, packed;
-    const std::string model = get(a, "--model");
-    if (!model.empty()) {
-        std::ifstream in(model, std::ios::binary);
-        payload.assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-        if (payload.empty()) {
-            std::cerr << "measure: cannot read " << model << "\n";
-            return 1;
-        }
-        packed = packRawModel(payload);
-        ModelRegistry::instance().registerModel("mdcb", packed.data(), packed.data() + packed.size());
-    }
+    Served served;
+    if (!served.serve(a))
+        return 1;
     const size_t limit = static_cast<size_t>(std::atoi(get(a, "--limit", "600").c_str()));
     std::vector<FaceRow> report, dev;
     for (FaceRow const& r : readBoxes(get(a, "--boxes"))) {
@@ -1102,8 +1147,6 @@ int commandMeasure(std::map<std::string, std::string> const& a)
                         free.features / std::max(1.0, free.classified));
         }
     }
-    if (!model.empty())
-        ModelRegistry::instance().unregisterModel("mdcb");
     return 0;
 }
 
@@ -1413,6 +1456,21 @@ int commandJointModel(std::map<std::string, std::string> const& a)
             b.resize(static_cast<size_t>(stages));
     if (!get(a, "--bias").empty())
         jc.uprightBias = std::strtof(get(a, "--bias").c_str(), nullptr);
+    // --raise K:D,...: common stage K's thresholds raised by D for every
+    // category, trading a little recall for fewer features per window
+    std::istringstream raise(get(a, "--raise"));
+    for (std::string item; std::getline(raise, item, ',');) {
+        const size_t k = static_cast<size_t>(std::atoi(item.c_str()));
+        const size_t colon = item.find(':');
+        if (colon == std::string::npos || k >= jc.common.size()) {
+            std::cerr << "--raise wants STAGE:DELTA with a stage below " << jc.common.size() << "\n";
+            return 1;
+        }
+        const float delta = std::strtof(item.c_str() + colon + 1, nullptr);
+        for (float& t : jc.common[k].thresholds)
+            t += delta;
+        // the last common thresholds also set the margins the branch choice compares
+    }
     return CascadeWriter::writeFile(get(a, "--out"), jc.toModel()) ? 0 : 1;
 }
 
@@ -1420,18 +1478,9 @@ int commandJointModel(std::map<std::string, std::string> const& a)
 // through quorin_detect in the given modes.
 int commandRollMeasure(std::map<std::string, std::string> const& a)
 {
-    std::vector<uint8_t> payload, packed;
-    const std::string model = get(a, "--model");
-    if (!model.empty()) {
-        std::ifstream in(model, std::ios::binary);
-        payload.assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-        if (payload.empty()) {
-            std::cerr << "roll-measure: cannot read " << model << "\n";
-            return 1;
-        }
-        packed = packRawModel(payload);
-        ModelRegistry::instance().registerModel("mdcb", packed.data(), packed.data() + packed.size());
-    }
+    Served served;
+    if (!served.serve(a))
+        return 1;
     const size_t limit = static_cast<size_t>(std::atoi(get(a, "--limit", "300").c_str()));
     std::vector<FaceRow> report;
     for (FaceRow const& r : readBoxes(get(a, "--boxes")))
@@ -1452,17 +1501,9 @@ int commandRollMeasure(std::map<std::string, std::string> const& a)
             for (int t = 0; t < 2; ++t) {
                 const Gray g = rotatedAbout(photo, chosen[i].box.cx, chosen[i].box.cy, 30.0 * t);
                 IN_IMAGE image;
-                if (!image.Init(g.width, g.height, g.width, g.pixels.data()))
-                    continue;
-                d.setSearchStep(0.1f, 0.1f);
-                d.setFaceSizeRange(32, std::min(g.width, g.height));
-                DetectionWindow whole;
-                whole.left = 0;
-                whole.top = 0;
-                whole.right = g.width;
-                whole.bottom = g.height;
                 std::vector<ScoredWindow> hits;
-                d.exhaustiveDetect(image, {whole}, &hits);
+                if (!searchWhole(d, g, 0.1f, 32, image, hits))
+                    continue;
                 for (ScoredWindow const& h : hits)
                     ++byCategory[t][h.category];
             }
@@ -1512,6 +1553,9 @@ int commandRollMeasure(std::map<std::string, std::string> const& a)
                     if (bestIou >= 0.4) {
                         ++found;
                         rollError += std::abs(roll - (r.roll + sign * angle));
+                        if (std::getenv("MEASURE_VERBOSE") != nullptr)
+                            std::printf("  %s turned %d: roll %d, labelled %.1f, IoU %.2f\n", r.path.c_str(), sign * angle,
+                                        roll, r.roll + sign * angle, bestIou);
                     }
                 }
             }
@@ -1521,8 +1565,6 @@ int commandRollMeasure(std::map<std::string, std::string> const& a)
         }
         quorin_release();
     }
-    if (!model.empty())
-        ModelRegistry::instance().unregisterModel("mdcb");
     return 0;
 }
 

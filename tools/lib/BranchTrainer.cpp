@@ -441,20 +441,6 @@ CascadeModelStage engineStage(JointStump const& s, float gain, bool remapFirst, 
     return m;
 }
 
-// Adds a constant per category and rejects nothing.
-CascadeModelStage constants(std::vector<float> const& add)
-{
-    CascadeModelStage m;
-    m.feature.kind = 0;
-    m.binThresholds.fill(0.0f);
-    m.scoreCount = static_cast<int32_t>(add.size());
-    for (float a : add) {
-        m.binScores.push_back({{a, a, a, a, a, a, a, a}});
-        m.rejectThresholds.push_back(kNever);
-    }
-    return m;
-}
-
 // Zeroes all 15 scores from slot 14, which no stage writes: a branch then runs
 // its own cascade from 0, as it was trained.
 CascadeModelStage zeroAll()
@@ -500,7 +486,7 @@ CascadeModel JointCascade::toModel() const
     std::vector<float> shift(K, 0.0f);
     for (size_t c = 0; c < K; ++c)
         shift[c] = margin(static_cast<int>(c), 0.0f);
-    m.common.push_back(constants(shift));
+    m.common.push_back(CascadeWriter::constants(shift));
     // branch 0 upright, then per band the clockwise one and its mirror image
     for (size_t b = 0; b < K; ++b) {
         const size_t source = b == 0 ? 0 : 1 + (b - 1) / 2;
@@ -512,8 +498,7 @@ CascadeModel JointCascade::toModel() const
                     out.push_back(engineStage(s.stumps[j], g, false,
                                               {j + 1 == s.stumps.size() ? s.thresholds[0] * g : kNever}));
         const float last = source < branch.size() && !branch[source].empty() ? branch[source].back().thresholds[0] : 0.0f;
-        CascadeModelStage final = constants({-last * g});
-        out.push_back(final);
+        out.push_back(CascadeWriter::constants({-last * g}));
         if (b > 0 && (b - 1) % 2 == 1)
             mirrorStages(out);
         m.branches.push_back(std::move(out));

@@ -96,17 +96,6 @@ namespace {
 
 constexpr float kNever = -1e30f;
 
-CascadeModelStage constantStage(float add)
-{
-    CascadeModelStage s;
-    s.feature.kind = 0;
-    s.binThresholds.fill(0.0f);
-    s.scoreCount = 1;
-    s.binScores.push_back({{add, add, add, add, add, add, add, add}});
-    s.rejectThresholds.push_back(kNever);
-    return s;
-}
-
 // Copies the never-written slot 1 (exactly 0) over slot 0: the next boosted
 // stage starts its sum from 0.
 CascadeModelStage resetStage()
@@ -147,7 +136,7 @@ CascadeModel Cascade::toModel() const
         }
     }
     if (!stages.empty())
-        m.common.push_back(constantStage(-stages.back().threshold * gain));
+        m.common.push_back(CascadeWriter::constants({-stages.back().threshold * gain}));
     CascadeWriter::completeBranches(m);
     return m;
 }

@@ -91,6 +91,19 @@ public:
         return s;
     }
 
+    // A stage without a feature that adds one constant per score and rejects nothing.
+    static CascadeModelStage constants(std::vector<float> const& add)
+    {
+        CascadeModelStage s;
+        s.feature.kind = 0;
+        s.binThresholds.fill(0.0f);
+        s.scoreCount = static_cast<int32_t>(add.size());
+        for (float a : add) {
+            s.binScores.push_back({{a, a, a, a, a, a, a, a}});
+            s.rejectThresholds.push_back(-1e30f);
+        }
+        return s;
+    }
     // Pads `branches` with empty ones up to the scoreCount of the last common stage.
     static void completeBranches(CascadeModel& model)
     {
