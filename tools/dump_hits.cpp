@@ -16,7 +16,8 @@
 //
 // With --turns, each face photo is also searched turned in the plane (variant
 // t30, t-30, ...; each teacher face keeps its size, centred where its centre
-// turned to), for the material of the roll categories.
+// turned to), for the material of the roll categories; with --quarters also
+// turned by quarter turns (q90, q180, q270), where every hit is a false one.
 //
 // Output: FILE.tsv, one line per hit: image, variant (m = mirrored, r90 ...),
 // work long side, best IoU with a teacher face (-1 for images of negatives/),
@@ -57,7 +58,9 @@ const char* kUsage =
     "  --out PREFIX   writes PREFIX.tsv and PREFIX.f32 (default DIR/labels/hits)\n"
     "  --model FILE   a cascade payload to search with instead of the built-in one\n"
     "  --turns LIST   also search each face photo turned by these angles (degrees,\n"
-    "                 clockwise) about its centre, the teacher faces turned with it\n";
+    "                 clockwise) about its centre, the teacher faces turned with it\n"
+    "  --quarters     also search each face photo turned by 90, 180 and 270 degrees,\n"
+    "                 with no teacher face: what is found there is a false hit\n";
 
 struct Box {
     double left, top, right, bottom;
@@ -219,8 +222,13 @@ int main(int argc, char** argv)
     else if (const char* home = std::getenv("HOME"))
         data = std::string(home) + "/.cache/quorin";
     std::string out, model, turnList;
+    bool quarters = false;
     for (int i = 1; i < argc; ++i) {
         const std::string a = argv[i];
+        if (a == "--quarters") {
+            quarters = true;
+            continue;
+        }
         if (a == "--help" || a == "-h") {
             std::cout << kUsage;
             return 0;
@@ -295,6 +303,12 @@ int main(int argc, char** argv)
             std::ostringstream name;
             name << 't' << t;
             hits += miner.mine(entry.image, name.str(), f.pixels.data(), w, h, moved, false, kModes);
+        }
+        for (int q = 1; q <= 3 && quarters && !faceFree; ++q) {
+            // a face on its side or upside down is no face to the engine
+            const Frame t = turned(gray, w, h, q);
+            hits += miner.mine(entry.image, "q" + std::to_string(90 * q), t.pixels.data(), t.width, t.height, {}, false,
+                               kModes);
         }
         if (faceFree) {
             hits += miner.mine(entry.image, "-", gray, w, h, {}, true, kNegativeModes);

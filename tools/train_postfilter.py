@@ -85,9 +85,11 @@ def load_face_hits(prefix):
     feats = np.fromfile(prefix + '.f32', dtype='<f4')
     if feats.size != len(rows) * DIM:
         raise SystemExit('%s.tsv and .f32 disagree: run dump_hits again' % prefix)
-    keep = [i for i, r in enumerate(rows) if float(r[3]) >= 0.4]
+    # hits on quarter-turned photos (variant q90 ...) are false: a face on its side is none
+    keep = [i for i, r in enumerate(rows) if float(r[3]) >= 0.4 or r[1].startswith('q')]
     sets = np.array(['report' if tl.report_person(tl.person_of(rows[i][0])) else 'train' for i in keep])
-    return feats.reshape(len(rows), DIM)[keep], np.ones(len(keep), int), sets, [rows[i] for i in keep]
+    labels = np.array([0 if rows[i][1].startswith('q') else 1 for i in keep], int)
+    return feats.reshape(len(rows), DIM)[keep], labels, sets, [rows[i] for i in keep]
 
 
 def fit_logistic(x, y, l2, steps=30):
@@ -116,7 +118,7 @@ def decisions(category, feats):
     return (feats[:, 0] >= FAST_PASS) | (scores > 0), scores
 
 
-def fit_category(feats, labels, args):
+def fit_category(feats, labels, args, keep):
     """One category's model: the linear term on the standardised feature, folded
     back onto the raw one, with the bias that keeps --keep of its training faces
     that the fast pass doesn't already let through."""
@@ -128,7 +130,7 @@ def fit_category(feats, labels, args):
     margin = x @ raw_w + (b - mu @ raw_w)
     judged = (labels == 1) & (feats[:, 0] < FAST_PASS)
     pos_margin = np.sort(margin[judged])
-    cut = pos_margin[int(np.floor((1.0 - args.keep) * len(pos_margin)))] if len(pos_margin) else 0.0
+    cut = pos_margin[int(np.floor((1.0 - keep) * len(pos_margin)))] if len(pos_margin) else 0.0
     shift = (b - mu @ raw_w) - cut + 1e-3  # faces at the cut stay strictly above 0
     return (raw_w, np.zeros(0), np.zeros((0, DIM)), np.zeros((0, DIM)), -shift)
 
@@ -155,6 +157,8 @@ def main(argv=None):
                     help='payload whose figures are printed beside the new one (read before writing --out)')
     ap.add_argument('--l2', type=float, default=100.0, help='ridge weight on the standardised feature')
     ap.add_argument('--keep', type=float, default=0.999, help='share of training faces the bias keeps')
+    ap.add_argument('--keep-turned', type=float, default=None,
+                    help='share of training faces kept in categories 1 and up (default: --keep)')
     ap.add_argument('--categories', type=int, default=1,
                     help='cascade categories with a model of their own (the hits\' last column); '
                          'the others take category 0\'s')
@@ -185,7 +189,7 @@ def main(argv=None):
             print('category %d: too few hits of both kinds, it takes category 0\'s model' % k)
             models.append(models[0])
             continue
-        models.append(fit_category(feats[m], labels[m], args))
+        models.append(fit_category(feats[m], labels[m], args, args.keep if k == 0 else args.keep_turned or args.keep))
     payload = ilabs.write_ilabs(models + [models[0]] * (ilabs.CATEGORY_NUMBER - len(models)))
     quantised_all = ilabs.read_ilabs(payload)
     quantised = quantised_all[0]
