@@ -32,6 +32,7 @@ void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
 namespace {
 
 using Bytes = std::vector<uint8_t>;
+using ivbgolden::withByte;
 
 // One entry (info + object) as the packer lays it out.
 Bytes entry(const std::string& name, uint16_t tag, const Bytes& object) {
@@ -55,11 +56,6 @@ Bytes composite(const std::vector<Bytes>& entries) {
     Bytes body;
     for (const Bytes& e : entries) body.insert(body.end(), e.begin(), e.end());
     return object(ivb::kComposite, 0, body);
-}
-
-Bytes withByte(Bytes b, std::size_t at, uint8_t v) {
-    b[at] = v;
-    return b;
 }
 
 }  // namespace

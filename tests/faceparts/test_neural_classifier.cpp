@@ -152,14 +152,6 @@ TEST(ClassifierLoad, LoadsThatLeaveNoRunnableNet) {
     }
 }
 
-TEST(ClassifierLoad, ReadsThroughTheModelReader) {
-    ScopedModel model("fptestnet", smallContainer());
-    NeuralClassifier c;
-    EXPECT_NO_THROW(c.loadFromPath("fptestnet"));
-    EXPECT_THROW(c.loadFromPath("fpnosuchmodel"), qv_data_error);
-    EXPECT_THROW(c.loadFromPath(""), qv_data_error);
-}
-
 TEST(ClassifierClassify, ChecksArgumentsInOrderAndClearsTheOutputs) {
     NeuralClassifier c;
     uint32_t best = 5;
