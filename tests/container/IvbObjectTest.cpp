@@ -32,6 +32,7 @@ void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
 namespace {
 
 using Bytes = std::vector<uint8_t>;
+using ivbgolden::withByte;
 
 // One entry (info + object) as the packer lays it out.
 Bytes entry(const std::string& name, uint16_t tag, const Bytes& object) {
@@ -55,11 +56,6 @@ Bytes composite(const std::vector<Bytes>& entries) {
     Bytes body;
     for (const Bytes& e : entries) body.insert(body.end(), e.begin(), e.end());
     return object(ivb::kComposite, 0, body);
-}
-
-Bytes withByte(Bytes b, std::size_t at, uint8_t v) {
-    b[at] = v;
-    return b;
 }
 
 }  // namespace
@@ -189,30 +185,10 @@ TEST(IvbUnpacker, MalformedCompositesAreRefused) {
     }
 }
 
-// Every truncation is refused; every byte set to a few values gives an
-// exception or a value that agrees with itself; never an overrun (ASan watches).
-TEST(IvbUnpacker, TruncatedAndDamagedBlobsAndModelsFailCleanly) {
-    const Bytes blobBytes = ivbgolden::byteBlob(), modelBytes = ivbgolden::faceModel();
+TEST(IvbUnpacker, EveryBlobTruncationIsRefused) {
+    const Bytes blobBytes = ivbgolden::byteBlob();
     for (std::size_t n = 0; n < blobBytes.size(); ++n)
         EXPECT_THROW(DataBlob().fromIvb(Bytes(blobBytes.begin(), blobBytes.begin() + n)), qv_ivb_conversion_error) << n;
-    for (uint8_t v : {0x00, 0x01, 0x10, 0x7F, 0x80, 0xFF}) {
-        for (std::size_t i = 0; i < blobBytes.size(); ++i) {
-            DataBlob blob;
-            try {
-                blob.fromIvb(withByte(blobBytes, i, v));
-                EXPECT_EQ(blob.getDataProperty().byteSize(), 2u) << i;
-            } catch (const std::exception&) {
-            }
-        }
-        for (std::size_t i = 0; i < modelBytes.size(); ++i) {
-            FaceModelData model;
-            try {
-                model.fromIvb(withByte(modelBytes, i, v));
-                EXPECT_EQ(model.projection.size(), model.dimension) << i;
-            } catch (const std::exception&) {
-            }
-        }
-    }
 }
 
 TEST(IvbUnpacker, CountsThatDisagreeWithTheDataAreRefusedBeforeAllocating) {

@@ -10,6 +10,7 @@
 namespace {
 
 using Bytes = std::vector<uint8_t>;
+using ivbgolden::withByte;
 
 std::string scratchFile(const std::string& name) {
     static const std::string dir = sourcetree::scratchDir("ivb_stream");
@@ -95,16 +96,11 @@ TEST(IvbMemoryStream, ReadsAndSeeksStayInsideTheRange) {
 
 TEST(IvbStreamDamage, HeaderFailuresOverMemory) {
     const Bytes good = ivbgolden::streamWithOneObject();
-    auto with = [&](std::size_t at, uint8_t v) {
-        Bytes b = good;
-        b[at] = v;
-        return b;
-    };
     const std::string notIvb = "Not a valid QV IVB file";
     const std::vector<std::pair<Bytes, std::string>> cases = {
-        {Bytes(), notIvb},         {Bytes(good.begin(), good.begin() + 16), notIvb},
-        {with(0, 'J'), notIvb},    {with(6, 2), notIvb},
-        {with(7, 1), notIvb},      {with(14, 40), "Read beyong stream"},  // label past the end
+        {Bytes(), notIvb},                   {Bytes(good.begin(), good.begin() + 16), notIvb},
+        {withByte(good, 0, 'J'), notIvb},    {withByte(good, 6, 2), notIvb},
+        {withByte(good, 7, 1), notIvb},      {withByte(good, 14, 40), "Read beyong stream"},  // label past the end
     };
     for (const auto& c : cases) {
         SCOPED_TRACE(&c - &cases[0]);

@@ -110,27 +110,15 @@ TEST(JsonObjectItem, BooleansAreWordsAndInnerFailuresBecomeJsonErrors) {
     expectThrowWith<JsonError>([] { jsonNamedValue("r", Unwritable()); }, "Json serialization error");
 }
 
-// Every prefix of a valid text, and random texts over the dialect's own
-// characters, either parse or raise JsonError: no crash, no read out of
-// bounds (this suite also runs under ASan/UBSan).
-TEST(JsonRobustness, TruncatedAndGarbageTextsFailCleanly) {
-    auto tolerate = [](auto f) {
-        try {
-            f();
-        } catch (const JsonError&) {
-        }
-    };
+// Every prefix of a valid text parses or raises JsonError, never reading out
+// of bounds (ASan/UBSan); random texts are the JSON fuzz target's.
+TEST(JsonRobustness, TruncatedTextsFailCleanly) {
     const std::string text = "{\"a\":[1,{\"b\":\"}\"}],\"c\":{\"d\":{\"e\":[[]]}},\"f\":\"g\",\"h\":1 2 ,\"i\":,}";
     ASSERT_EQ(parseJsonObject(text).size(), 5u);
-    for (std::size_t n = 0; n < text.size(); ++n) tolerate([&] { parseJsonObject(text.substr(0, n)); });
-
-    const std::string alphabet = "{}[]\",: \t\r\nab1\\";
-    std::mt19937 rng(20240611u);
-    for (int round = 0; round < 20000; ++round) {
-        std::string t;
-        for (int i = static_cast<int>(rng() % 24); i > 0; --i) t += alphabet[rng() % alphabet.size()];
-        t = (round % 2 ? "{" : "[") + t + (round % 2 ? "}" : "]");
-        tolerate([&] { parseJsonObject(t); });
-        tolerate([&] { parseJsonArray(t); });
+    for (std::size_t n = 0; n < text.size(); ++n) {
+        try {
+            parseJsonObject(text.substr(0, n));
+        } catch (const JsonError&) {
+        }
     }
 }

@@ -11,6 +11,7 @@
 #include "core/Errors.h"
 #include "faceparts/FacePartLocator.h"
 #include "faceparts/NeuralNet.h"
+#include "support/ExpectThrow.h"
 #include "support/ScopedModel.h"
 
 using netwriter::NetDescription;
@@ -64,12 +65,7 @@ TEST_F(LocatorTest, NonSquareInputCountLeavesTheLocatorUnusable) {
     load(netwriter::denseNet({1000, 10}, {0, TXF_LINEAR}, {1, 1}, 1, 0, true, 10));
     EXPECT_FALSE(locator_.ready());
     std::vector<FaceData> faces = {faceAt(10, 10, 60, 60)};
-    try {
-        locate(faces);
-        FAIL() << "expected a failure";
-    } catch (const qv_operation_error& e) {
-        EXPECT_STREQ(e.what(), "Failed to detect face parts");
-    }
+    expectThrowWith<qv_operation_error>([&] { locate(faces); }, "Failed to detect face parts");
     for (const char* name : FacePartLocator::kPartNames) EXPECT_EQ(faces[0].landmark(name), Point2<float>(-1, -1));
 }
 

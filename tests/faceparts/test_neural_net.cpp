@@ -13,6 +13,7 @@
 #include "NetWriter.h"
 #include "core/Errors.h"
 #include "faceparts/NeuralNet.h"
+#include "support/ExpectThrow.h"
 
 using netwriter::NetDescription;
 using netwriter::Span;
@@ -136,12 +137,8 @@ TEST(NetReader, RefusesBrokenFieldsWithItsMessage) {
         b.second(d);
         const auto blob = netwriter::writeBlob(d);
         NeuralNet net;
-        try {
-            net.loadBuffer(blob.data(), blob.size());
-            ADD_FAILURE() << b.first << " loaded";
-        } catch (const qv_operation_error& e) {
-            EXPECT_STREQ(e.what(), "Failed to set algorithm in CNeuralNet") << b.first;
-        }
+        expectThrowWith<qv_operation_error>([&] { net.loadBuffer(blob.data(), blob.size()); },
+                                            "Failed to set algorithm in CNeuralNet", b.first);
     }
 }
 

@@ -152,7 +152,7 @@ TEST(ILabsFeature, ToolMirrorGivesTheSameFeature)
         GTEST_SKIP() << "no system Python with numpy";
     std::vector<uint8_t> pixels = pftest::noisyFrame(97, 83);
     const std::string framePath = ::testing::TempDir() + "pf_mirror_frame.raw";
-    pftest::writeFile(framePath, pixels);
+    sourcetree::writeText(framePath, std::string(pixels.begin(), pixels.end()));
     IN_IMAGE image;
     image.Init(97, 83, 97, pixels.data());
     // Whole-pixel, fractional and clipped windows.

@@ -112,6 +112,12 @@ inline std::vector<uint8_t> pcaTransform() {
                "  00 00 80 3F  00 00 00 40  00 00 40 40  00 00 80 40  00 00 00 3F  00 00 80 BF");
 }
 
+// `b` with byte `at` set to `v`, for the damage tables.
+inline std::vector<uint8_t> withByte(std::vector<uint8_t> b, std::size_t at, uint8_t v) {
+    b[at] = v;
+    return b;
+}
+
 }  // namespace ivbgolden
 
 #endif

@@ -8,7 +8,6 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
 #include <random>
 #include <sstream>
 #include <string>
@@ -100,11 +99,6 @@ inline std::vector<uint8_t> noisyFrame(int width, int height, uint32_t seed = 11
     for (int y = 0; y < height; ++y)
         for (int x = 0; x < width; ++x) pixels[y * width + x] = static_cast<uint8_t>((x * 3 + y * 5) % 97 + rng() % 140);
     return pixels;
-}
-
-inline void writeFile(const std::string& path, const std::vector<uint8_t>& bytes) {
-    std::ofstream out(path, std::ios::binary);
-    out.write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
 }
 
 // True when tools/ilabs_feature.py can run (system Python with numpy).

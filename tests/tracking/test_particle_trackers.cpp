@@ -1,8 +1,5 @@
-// The particle machine shared by PF_TRACKER and CPF_TRACKER (lattice seeding,
-// resampling, clouds without evidence, the PF tracker's association), the
-// on-line observers and their discriminant, and the cascade filter that
-// carries them: training, bounds, the ring of training sets, and filters that
-// keep pointing at their own observers when a CascadePF is copied or moved.
+// The particle machine of PF_TRACKER and CPF_TRACKER, the on-line observers,
+// and the cascade filter that carries them.
 
 #include <gtest/gtest.h>
 
@@ -146,12 +143,7 @@ TEST(PFTracker, MatchesOnTheMeanDropsUnconfirmedFacesAndNeedsADetector)
     std::vector<DetectionWindow> out;
     t.getPreviousFaces(&out);
     EXPECT_TRUE(out.empty());
-    try {
-        t.predict(image, &out);
-        FAIL() << "no detector";
-    } catch (const qv_operation_error& e) {
-        EXPECT_STREQ(e.what(), "Face estimator doesn't have a detector yet");
-    }
+    expectThrowWith<qv_operation_error>([&] { t.predict(image, &out); }, "Face estimator doesn't have a detector yet");
     // Dead slots stack again every frame, but the stack stays bounded.
     for (int i = 0; i < 3000; ++i) t.update(image, {});
     EXPECT_LE(t.pfFaces.freeSlots.size(), 1024u);

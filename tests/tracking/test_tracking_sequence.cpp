@@ -1,7 +1,5 @@
-// All four trackers on a moving real face: at least 150 frames of a face crop
-// over a textured background, detections that miss now and then, and the
-// tracked window held on the face. Then a long run of the particle trackers
-// with faces coming and going, whose heap must stop growing after warm-up.
+// All four trackers held on a moving real face, and the particle trackers'
+// heap bounded over a long run with faces coming and going.
 
 #include <gtest/gtest.h>
 
@@ -93,20 +91,11 @@ int framesHeld(const std::string& name, const facesequence::Gray& face, CascadeD
 
 } // namespace
 
-// A missed detection ends a track, and the frame after it has none: 10 of the
-// 160 frames go that way, so 150 is the most any tracker can hold.
-//
-// The cascade filter follows by appearance alone: a detection retrains its
-// observers but never moves its cloud, and the cloud has no velocity. Its
-// window is a weighted mean over a cloud twelve pixels wide whose weights
-// differ by a factor of e at most (the boosted discriminants agree, so the
-// vote is +-1), and the 5-feature discriminant is flat (its first feature is
-// the window's inverse deviation, a thousand times smaller than the Haar
-// values, so its logistic stays near 0.5). Such a mean trails a face by part
-// of each step: it holds up to about 1.5 pixels a frame, and past that the
-// cloud falls behind until no sample is positive any more. On the fast path
-// it is held to what it reaches there (63 frames with this seed); below that
-// floor is a regression (a poisoned cloud stops at 0).
+// A missed detection ends a track and the next frame has none: 150 of 160 is
+// the most any tracker can hold. The cascade filter follows by appearance
+// alone (no velocity, a nearly flat weighted mean), so it trails a face faster
+// than about 1.5 pixels a frame: on the fast path it reaches 63 with this
+// seed, and 60 is the floor (a poisoned cloud stops at 0).
 TEST(TrackingSequence, EveryTrackerHoldsAMovingRealFace)
 {
     const facesequence::Gray face = facesequence::faceCrop(kSide);
