@@ -1317,9 +1317,6 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
         }
         say("common stage %zu: positives %zu / %zu / %zu, %zu negatives from %zu variants (%zu accepted windows seen)", k,
             pos[0].size(), pos[1].size(), pos[2].size(), neg.size(), variants, searched);
-        std::vector<JointClass> classes;
-        for (size_t c = 0; c < K; ++c)
-            classes.push_back({&pos[c], {&neg}});
         StageOptions o;
         o.seed = cfg.seed * 7919u + k;
         o.threads = cfg.threads;
@@ -1332,11 +1329,12 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
         const JointCascade* prior = &jc;
         JointReport rep;
         JointStage st = trainSoftStage(
-            pool, classes, [prior](const uint32_t* ii, float inv, float* sums) {
+            pool, {&pos[0], &pos[1], &pos[2]}, neg,
+            [prior](const uint32_t* ii, float inv, float* sums) {
                 bool al[15];
                 prior->commonSums(ii, inv, sums, al);
             },
-            neg, alive, o, &rep);
+            alive, o, &rep);
         jc.common.push_back(std::move(st));
         jc.branch.assign(2, {});
         jc.uprightBias = 0;
@@ -1427,12 +1425,13 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
             std::vector<JointStage> const* prior = &jc.branch[b];
             JointReport rep;
             JointStage st = trainSoftStage(
-                pool, {{&pos, {&neg}}}, [prior](const uint32_t* ii, float inv, float* sums) {
+                pool, {&pos}, neg,
+                [prior](const uint32_t* ii, float inv, float* sums) {
                     sums[0] = 0.0f;
                     for (JointStage const& s : *prior)
                         sums[0] += s.sums(ii, inv)[0];
                 },
-                neg, {}, o, &rep);
+                {}, o, &rep);
             jc.branch[b].push_back(std::move(st));
             save();
             say("branch %zu stage %d done: %d stumps, hit %.4f, false %.4f, median margin %.3f", b, k, rep.stumps,

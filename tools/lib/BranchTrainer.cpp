@@ -5,7 +5,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
-#include <map>
 #include <memory>
 #include <random>
 #include <thread>
@@ -35,23 +34,13 @@ std::vector<float> JointStage::sums(const uint32_t* integral, float inverseDevia
     return s;
 }
 
-Feature mirrored(Feature const& f)
-{
-    Feature m = f;
-    for (Rect& r : m.rects) {
-        const int left = kPatch - r.right, right = kPatch - r.left;
-        r.left = left;
-        r.right = right;
-    }
-    return m;
-}
-
 namespace {
 
 constexpr float kNever = -1e30f;
 
-// Every distinct sample of all categories once, with each category's entries
-// (index into the flat list, label).
+// The background once, then each category's positives; each category's
+// entries are its positives, then the whole background (index into the flat
+// list, label).
 struct Flat {
     std::vector<const uint32_t*> integral;
     std::vector<float> inverseDeviation;
@@ -59,36 +48,27 @@ struct Flat {
     std::vector<std::vector<double>> label; // per category
 };
 
-Flat flatten(std::vector<JointClass> const& classes)
+Flat flatten(std::vector<SampleSet const*> const& positives, SampleSet const& background)
 {
     Flat f;
-    std::map<SampleSet const*, size_t> start;
-    auto place = [&](SampleSet const* s) {
-        auto it = start.find(s);
-        if (it != start.end())
-            return it->second;
+    auto place = [&](SampleSet const& s) {
         const size_t at = f.integral.size();
-        for (size_t i = 0; i < s->size(); ++i) {
-            f.integral.push_back(s->integral(i));
-            f.inverseDeviation.push_back(s->inverseDeviation(i));
+        for (size_t i = 0; i < s.size(); ++i) {
+            f.integral.push_back(s.integral(i));
+            f.inverseDeviation.push_back(s.inverseDeviation(i));
         }
-        start[s] = at;
         return at;
     };
-    for (JointClass const& c : classes) {
+    place(background);
+    for (SampleSet const* p : positives) {
         std::vector<size_t> idx;
-        std::vector<double> lab;
-        const size_t p = place(c.positives);
-        for (size_t i = 0; i < c.positives->size(); ++i) {
-            idx.push_back(p + i);
-            lab.push_back(1.0);
-        }
-        for (SampleSet const* n : c.negatives) {
-            const size_t q = place(n);
-            for (size_t i = 0; i < n->size(); ++i) {
-                idx.push_back(q + i);
-                lab.push_back(-1.0);
-            }
+        std::vector<double> lab(p->size(), 1.0);
+        const size_t at = place(*p);
+        for (size_t i = 0; i < p->size(); ++i)
+            idx.push_back(at + i);
+        for (size_t i = 0; i < background.size(); ++i) {
+            idx.push_back(i);
+            lab.push_back(-1.0);
         }
         f.index.push_back(std::move(idx));
         f.label.push_back(std::move(lab));
@@ -106,8 +86,7 @@ struct Pick {
 bool better(Pick const& a, Pick const& b) { return a.gain > b.gain || (a.gain == b.gain && a.order < b.order); }
 
 void searchJoint(FeaturePool const& pool, Flat const& f, std::vector<std::vector<double>> const& w,
-                 std::vector<size_t> const& active, std::vector<size_t> const& draw, size_t first, size_t step, int bins,
-                 Pick* best)
+                 std::vector<size_t> const& draw, size_t first, size_t step, int bins, Pick* best)
 {
     const size_t K = f.index.size();
     std::vector<float> values(f.integral.size());
@@ -130,7 +109,7 @@ void searchJoint(FeaturePool const& pool, Flat const& f, std::vector<std::vector
         if (!(hi > lo))
             continue;
         const double scale = bins / (static_cast<double>(hi) - lo);
-        for (size_t c : active) {
+        for (size_t c = 0; c < K; ++c) {
             std::fill(binW[c].begin(), binW[c].end(), 0.0);
             std::fill(binS[c].begin(), binS[c].end(), 0.0);
             for (size_t i = 0; i < f.index[c].size(); ++i) {
@@ -143,7 +122,7 @@ void searchJoint(FeaturePool const& pool, Flat const& f, std::vector<std::vector
         std::fill(rightS.begin(), rightS.end(), 0.0);
         for (int k = bins - 1; k >= 1; --k) {
             double gain = 0;
-            for (size_t c : active) {
+            for (size_t c = 0; c < K; ++c) {
                 rightW[c] += binW[c][k];
                 rightS[c] += binS[c][k];
                 const double leftW = totalW[c] - rightW[c], leftS = totalS[c] - rightS[c];
@@ -173,10 +152,11 @@ struct Booster {
 
     // masks[c][i]: background sample i (category c's negatives after its
     // positives) is still alive in category c; the others weigh nothing
-    Booster(std::vector<JointClass> const& classes, PriorSums const& prior, std::vector<std::vector<char>> const& masks)
-        : f(flatten(classes))
+    Booster(std::vector<SampleSet const*> const& positives, SampleSet const& background, PriorSums const& prior,
+            std::vector<std::vector<char>> const& masks)
+        : f(flatten(positives, background))
     {
-        const size_t K = classes.size();
+        const size_t K = positives.size();
         F.assign(K, std::vector<float>(f.integral.size(), 0.0f));
         std::vector<float> sums(K);
         for (size_t g = 0; g < f.integral.size(); ++g)
@@ -186,7 +166,7 @@ struct Booster {
                     F[c][g] = sums[c];
             }
         for (size_t c = 0; c < K; ++c) {
-            const size_t np = classes[c].positives->size();
+            const size_t np = positives[c]->size();
             w.emplace_back(f.index[c].size());
             double pos = 0, neg = 0;
             for (size_t i = 0; i < w[c].size(); ++i) {
@@ -238,19 +218,15 @@ struct Booster {
         const size_t perRound =
             std::max<size_t>(1, static_cast<size_t>(options.featureFraction * static_cast<double>(pool.size())));
         const int threads = std::max(1, options.threads);
-        std::vector<size_t> active(f.index.size());
-        for (size_t c = 0; c < active.size(); ++c)
-            active[c] = c;
         std::vector<size_t> draw(perRound);
         for (size_t& d : draw)
             d = static_cast<size_t>(rng() % pool.size());
         std::vector<Pick> best(static_cast<size_t>(threads));
         std::vector<std::thread> workers;
         for (int t = 1; t < threads; ++t)
-            workers.emplace_back(searchJoint, std::cref(pool), std::cref(f), std::cref(w), std::cref(active),
-                                 std::cref(draw), static_cast<size_t>(t), static_cast<size_t>(threads), options.bins,
+            workers.emplace_back(searchJoint, std::cref(pool), std::cref(f), std::cref(w), std::cref(draw), static_cast<size_t>(t), static_cast<size_t>(threads), options.bins,
                                  &best[static_cast<size_t>(t)]);
-        searchJoint(pool, f, w, active, draw, 0, static_cast<size_t>(threads), options.bins, &best[0]);
+        searchJoint(pool, f, w, draw, 0, static_cast<size_t>(threads), options.bins, &best[0]);
         for (std::thread& th : workers)
             th.join();
         Pick top = best[0];
@@ -291,17 +267,12 @@ struct Booster {
 
 } // namespace
 
-JointStage trainSoftStage(FeaturePool const& pool, std::vector<JointClass> const& classes, PriorSums const& prior,
-                          SampleSet const& background, std::vector<std::vector<char>> const& alive,
-                          StageOptions const& options, JointReport* report)
+JointStage trainSoftStage(FeaturePool const& pool, std::vector<SampleSet const*> const& positives,
+                          SampleSet const& background, PriorSums const& prior,
+                          std::vector<std::vector<char>> const& alive, StageOptions const& options, JointReport* report)
 {
-    Booster boost(classes, prior, alive);
-    const size_t K = classes.size();
-    // every category's negatives are the background, right after its positives
-    std::vector<std::vector<size_t>> at(K);
-    for (size_t c = 0; c < K; ++c)
-        for (size_t i = classes[c].positives->size(); i < boost.f.index[c].size(); ++i)
-            at[c].push_back(boost.f.index[c][i]);
+    Booster boost(positives, background, prior, alive);
+    const size_t K = positives.size();
     JointStage stage;
     JointReport rep;
     std::mt19937_64 rng(options.seed);
@@ -317,12 +288,12 @@ JointStage trainSoftStage(FeaturePool const& pool, std::vector<JointClass> const
         stage.thresholds.assign(K, 0.0f);
         rep.hitRate.assign(K, 0.0);
         for (size_t c = 0; c < K; ++c)
-            stage.thresholds[c] = boost.cut(c, classes[c].positives->size(), options.minHitRate, &rep.hitRate[c]);
+            stage.thresholds[c] = boost.cut(c, positives[c]->size(), options.minHitRate, &rep.hitRate[c]);
         size_t kept = 0;
         for (size_t g = 0; g < background.size(); ++g) {
             bool any = false;
             for (size_t c = 0; c < K && !any; ++c)
-                any = (c >= alive.size() || alive[c][g]) && boost.F[c][at[c][g]] >= stage.thresholds[c];
+                any = (c >= alive.size() || alive[c][g]) && boost.F[c][g] >= stage.thresholds[c];
             kept += any;
         }
         rep.falseRate = static_cast<double>(kept) / std::max<size_t>(1, background.size());
@@ -332,7 +303,7 @@ JointStage trainSoftStage(FeaturePool const& pool, std::vector<JointClass> const
     }
     {
         std::vector<float> margins;
-        const size_t np = classes[0].positives->size();
+        const size_t np = positives[0]->size();
         for (size_t i = 0; i < np; ++i) {
             const float v = boost.F[0][boost.f.index[0][i]] - (stage.thresholds.empty() ? 0.0f : stage.thresholds[0]);
             if (v >= 0)

@@ -41,12 +41,6 @@ struct JointStage {
     std::vector<float> sums(const uint32_t* integral, float inverseDeviation) const;
 };
 
-// One category of a joint stage: its positives against its negatives.
-struct JointClass {
-    SampleSet const* positives = nullptr;
-    std::vector<SampleSet const*> negatives;
-};
-
 struct JointReport {
     std::vector<double> hitRate; // per category
     double falseRate = 0;        // share of the background any category keeps
@@ -56,22 +50,18 @@ struct JointReport {
 // The running sums the earlier stages leave for a sample, one per category.
 using PriorSums = std::function<void(const uint32_t* integral, float inverseDeviation, float* sums)>;
 
-// Boosts one stage of the soft cascade: each round takes the feature and split
-// that lower the summed weighted error of all categories most (gentle
-// boosting, started from the prior sums), and gives each category its own
-// eight-bin table on that feature. Each category's threshold keeps
-// options.minHitRate of its positives; the stage ends once at most
-// options.maxFalseRate of `background` (the samples the categories' negatives
-// are drawn from) passes some category, or at options.maxStumps.
-// Deterministic for a seed.
-// Every category's negatives must be {&background}; alive[c][i] tells whether
-// background sample i is still alive in category c (empty: all are).
-JointStage trainSoftStage(FeaturePool const& pool, std::vector<JointClass> const& classes, PriorSums const& prior,
-                          SampleSet const& background, std::vector<std::vector<char>> const& alive,
-                          StageOptions const& options, JointReport* report);
-
-// Left-right mirror image of a feature in the 24 x 24 window.
-Feature mirrored(Feature const& f);
+// Boosts one stage of the soft cascade, one category per positive set, all
+// against `background`: each round takes the feature and split that lower the
+// summed weighted error of all categories most (gentle boosting, started from
+// the prior sums), and gives each category its own eight-bin table on that
+// feature. alive[c][i] tells whether background sample i is still alive in
+// category c (empty: all are); the others weigh nothing. Each category's
+// threshold keeps options.minHitRate of its positives; the stage ends once at
+// most options.maxFalseRate of the background passes some category, or at
+// options.maxStumps. Deterministic for a seed.
+JointStage trainSoftStage(FeaturePool const& pool, std::vector<SampleSet const*> const& positives,
+                          SampleSet const& background, PriorSums const& prior,
+                          std::vector<std::vector<char>> const& alive, StageOptions const& options, JointReport* report);
 
 // The branched cascade: common stages over all categories, then per category
 // a branch that runs its own cascade from 0 (the counter-clockwise bands are
