@@ -274,49 +274,6 @@ TEST(CommandLine, ImagesAndRawFramesGiveOneJsonLineEach) {
   EXPECT_EQ(lines.rfind("{\"frame\":0,", 0), 0u);
 }
 
-// The rectangles of each JSON line of a raw run, as left, top, right, bottom, sorted.
-std::vector<std::vector<std::vector<long long>>> rectsPerLine(const std::string& out) {
-  std::vector<std::vector<std::vector<long long>>> lines;
-  std::istringstream in(out);
-  for (std::string line; std::getline(in, line);) {
-    lines.emplace_back();
-    for (std::size_t at = line.find("\"rect\""); at != std::string::npos; at = line.find("\"rect\"", at + 1)) {
-      std::vector<long long> r(4);
-      std::sscanf(line.c_str() + at, R"("rect":{"left":%lld,"top":%lld,"right":%lld,"bottom":%lld)", &r[0], &r[1],
-                  &r[2], &r[3]);
-      lines.back().push_back(r);
-    }
-    std::sort(lines.back().begin(), lines.back().end());
-  }
-  return lines;
-}
-
-// The Kalman tracker through FaceDetector sees the frames as the C API's
-// tracking mode does, so both report the same faces.
-TEST(TrackerOption, KalmanThroughTheDetectorClassMatchesTheTrackingMode) {
-  const std::string photo = devdata::photo("tracking_faces.jpg");
-  if (!devdata::exists(photo)) GTEST_SKIP() << devdata::missingNote();
-  const Image gray = toGray(loadImage(photo));
-  Bytes frames;
-  for (int k = 0; k < 3; ++k) frames.insert(frames.end(), gray.pixels.begin(), gray.pixels.end());
-  const std::string size = std::to_string(gray.width) + "x" + std::to_string(gray.height);
-
-  const CliRun api = runCli({"--raw", size}, frames);
-  ASSERT_EQ(api.status, 0) << api.err;
-  const CliRun kf = runCli({"--raw", size, "--tracker", "kf"}, frames);
-  ASSERT_EQ(kf.status, 0) << kf.err;
-  const auto expected = rectsPerLine(api.out), got = rectsPerLine(kf.out);
-  ASSERT_EQ(expected.size(), 3u);
-  ASSERT_EQ(got.size(), 3u);
-  ASSERT_GE(expected[0].size(), 1u) << "the tracking mode finds a face in the development photo";
-  for (std::size_t k = 0; k < 3; ++k) {
-    ASSERT_EQ(expected[k].size(), got[k].size()) << "frame " << k;
-    // Both scale back from the 320 work frame, each with its own rounding.
-    for (std::size_t i = 0; i < got[k].size(); ++i)
-      for (std::size_t e = 0; e < 4; ++e) EXPECT_NEAR(expected[k][i][e], got[k][i][e], 2) << "frame " << k;
-  }
-}
-
 // The record file holds the faces of the JSON line in the same pixels; a name
 // a record can't hold fails that image, and the others are still written.
 TEST(JvwOutput, RecordsTheFacesOfTheJsonLine) {
