@@ -67,18 +67,6 @@ struct Scene {
 
 } // namespace
 
-TEST(CascadeConfiguration, SearchStepsFollowTheWindowAndNeverReachZero)
-{
-    SquareDetector s;
-    s.det.setSearchStep(0.5f, 2.0f); // clamped to 1
-    EXPECT_EQ(s.det.stepX[0], 12);
-    EXPECT_EQ(s.det.stepY[16], 853);
-    // A ratio that would round to no step still moves the search on.
-    s.det.setSearchStep(0.0f, -1.0f);
-    EXPECT_EQ(s.det.stepX[0], 1);
-    EXPECT_EQ(s.det.stepY[5], 1);
-}
-
 TEST(CascadeConfiguration, SizesFixTheScaleRangeAndRangesBeyondTheTablesAreRefused)
 {
     ScopedModel model("squarecascade", CascadeWriter::toBytes(squareCascade()));

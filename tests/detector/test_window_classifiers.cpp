@@ -207,18 +207,6 @@ TEST(FeaturePoolShapes, FirstIsTheDeviationFeatureAndTheRestStayInsideTheWindow)
     }
 }
 
-TEST(FeaturePoolLimits, DegenerateArgumentsNeitherLoopNorCrash)
-{
-    Pool none(0, 0, 1, 1, 0.5f, 1.2f);
-    EXPECT_EQ(none.count, 1);
-    Pool zeroMin(6, 6, 0, -3, 0.0f, 0.0f); // cells start at one pixel
-    EXPECT_GT(zeroMin.count, 1);
-    int count = -7;
-    EXPECT_EQ(WindowFeature::generateFeaturePool(100000, 100000, 1, 1, 0.0f, 1.0f, &count), nullptr);
-    EXPECT_EQ(count, -7);
-    WindowFeature::destroyFeaturePool(nullptr);
-}
-
 TEST(ScaleFeatures, WalkGivesTheFeaturesOwnValuesBitForBit)
 {
     // Rectangle counts around the straight-line cases 2 and 4, the
@@ -268,18 +256,4 @@ TEST(ScaleFeatures, WalkGivesTheFeaturesOwnValuesBitForBit)
                 }
             }
     }
-}
-
-TEST(ScaleFeatures, HaarFeatureWithoutRectanglesCountsZero)
-{
-    // A feature whose rectangles could not be allocated is laid out empty
-    // rather than followed into a null array.
-    std::vector<WindowFeature> common(1);
-    common[0].kind = WindowFeature::HAAR;
-    common[0].haar = new HaarFeature();
-    common[0].haar->count = 3; // rects stays null
-    ScaleFeatures laidOut;
-    ASSERT_TRUE(laidOut.build(common, {}, 30));
-    const uint32_t integral[4] = {1, 2, 3, 4};
-    EXPECT_EQ(laidOut.common().value(integral, 0.5f), 0.0f);
 }

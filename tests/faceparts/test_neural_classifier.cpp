@@ -152,18 +152,6 @@ TEST(ClassifierLoad, LoadsThatLeaveNoRunnableNet) {
     }
 }
 
-TEST(ClassifierClassify, ChecksArgumentsInOrderAndClearsTheOutputs) {
-    NeuralClassifier c;
-    uint32_t best = 5;
-    float in[4] = {0, 0, 0, 0};
-    float out[3] = {1, 1, 1};
-    EXPECT_EQ(messageOf([&] { c.Classify(nullptr, 4, nullptr, out, 3); }), "Invalid argument pInput in Classifier::Classify");
-    EXPECT_EQ(messageOf([&] { c.Classify(in, 4, nullptr, out, 3); }), "Invalid argument pulBestClass in Classifier::Classify");
-    EXPECT_THROW(c.Classify(in, 4, &best, out, 3), qv_operation_error);
-    EXPECT_EQ(best, 0u);
-    EXPECT_EQ(std::vector<float>(out, out + 3), std::vector<float>(3, 0.0f));
-}
-
 TEST(ClassifierClassify, TruncatesInputsAndMatchesTheReference) {
     const auto img = smallContainer();
     NeuralClassifier c;

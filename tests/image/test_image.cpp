@@ -34,32 +34,6 @@ TEST(ImageAllocation, MemoryIsReusedWhenItFitsAndBadRequestsAreRefused)
     }
 }
 
-TEST(ImageFillBox, WritesFromTheFirstByteAndNeverPastTheEnd)
-{
-    IMAGE img(8, 4, 8, nullptr);
-    img.ZeroImage();
-    img.FillBox(5, 7, 2, 3, 9); // whatever the position, from the first byte on
-    EXPECT_EQ(std::vector<int>({img.data[0], img.data[2], img.data[3], img.data[2 * 8 + 5]}),
-              std::vector<int>({9, 9, 0, 0}));
-    img.FillBox(0, 1000, 0, 0, 4); // cut at the image's end
-    EXPECT_EQ(img.data[31], 4);
-    img.FillBox(0, 3, 3, 2, 1); // top below bottom: nothing
-    EXPECT_EQ(img.data[0], 4);
-}
-
-TEST(ImageResize, NearestNeighbourCopiesAtEqualSizesAndEmptyImagesGiveNothing)
-{
-    std::vector<unsigned char> px(4 * 4);
-    std::iota(px.begin(), px.end(), 0);
-    IMAGE src(4, 4, 4, px.data()), same(4, 4, 4, nullptr), half(2, 2, 2, nullptr), none;
-    EXPECT_EQ(resizeImage(src, same), 120.0f); // the sum of the pixels
-    EXPECT_EQ(std::vector<unsigned char>(same.data, same.data + 16), px);
-    resizeImage(src, half);
-    EXPECT_EQ(std::vector<int>({half.data[0], half.data[1], half.data[half.stride]}), std::vector<int>({0, 2, 8}));
-    EXPECT_EQ(resizeImage(src, none), 0.0f);
-    EXPECT_EQ(resizeImage(none, half), 0.0f);
-}
-
 TEST(ImagePreProc, UniformPixelsGiveZerosReadThroughTheStride)
 {
     // 77 in rows of 13 bytes, the padding bright: any padding read shows.

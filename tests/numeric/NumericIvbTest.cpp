@@ -144,14 +144,6 @@ TEST(NumericIvb, HandWrittenLayoutsBothWays) {
     for (const Model& m : kModels) EXPECT_EQ(m.load(m.golden, m.golden), "") << m.name;
 }
 
-TEST(NumericIvb, EveryTruncationIsRefused) {
-    for (const Model& m : kModels) {
-        for (size_t n = 0; n < m.golden.size(); ++n)
-            EXPECT_EQ(m.load(m.golden, Bytes(m.golden.begin(), m.golden.begin() + static_cast<long>(n))), kConversion)
-                << m.name << " cut at " << n;
-    }
-}
-
 TEST(NumericIvb, DamagedMembersGetTheirErrors) {
     struct Case {
         const char* what;
