@@ -23,13 +23,18 @@
 //
 //   train_cascade joint-train --boxes TSV --negatives LIST --work DIR
 //                         [--common-stages N] [--branch-stages N] [--band LO:HI] [--minutes M]
+//                         [--train-branches 0,1] [--min-quarter-roll D]
 //       The roll cascade (tools/lib/BranchTrainer.h): common stages scoring
 //       the upright and the two turned categories, then an upright branch and
 //       a clockwise one (mirrored for counter-clockwise). Positives are the
 //       training photos turned about the face centre (upright within
 //       --upright-roll, turned within the band). Resumes from WORK/joint.txt.
 //   train_cascade joint-model --work DIR --out FILE [--branch-stages N] [--bias B] [--raise K:D,...]
-//       The engine payload of a joint-train state.
+//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV]
+//       The engine payload of a joint-train state; --upright-cascade puts a
+//       frontal cascade's stages (train's state) in the upright branch;
+//       --trace adds rejections inside common stage K that keep all but the
+//       QK quantile of the positives passing them (-1: none).
 //   train_cascade roll-measure --boxes TSV [--limit N] [--angles A,...] [--modes M,...]
 //       Faces found and mean roll error on report photos turned about the face
 //       centre, through quorin_detect.
@@ -613,6 +618,12 @@ struct Miner {
     std::vector<Gray> facePhotos;
     int faceShare = 30; // percent of the variants cut from face photos (misframed and turned faces)
     std::vector<Box> faceBoxes;
+    // The roll each face photo was turned by before (roll cascade); with
+    // minQuarterRoll a quarter turn that would leave its face within that
+    // many degrees of upright turns it half round instead, so that no face
+    // the branches should find is mined as a negative.
+    std::vector<double> faceRolls;
+    double minQuarterRoll = 0;
     std::string modelName = "cascade_in_training";
     // Which hits to keep and how: -1 drops it, 0 cuts it as it is, 1 mirrored
     // (a branch learns from its mirror branch's hits too). Unset keeps all.
@@ -650,6 +661,11 @@ struct Miner {
                 const size_t count = onFace ? facePhotos.size() : images.size();
                 vs.push_back({static_cast<size_t>(rng() % count) + (onFace ? images.size() : 0),
                               static_cast<int>(rng() % 4), sides[rng() % 9], (rng() & 1) != 0, steps[rng() % 3], rng()});
+                Variant& v = vs.back();
+                const size_t face = v.image - images.size();
+                if (onFace && v.quarters % 2 == 1 && face < faceRolls.size() &&
+                    90.0 - std::fabs(faceRolls[face]) < minQuarterRoll)
+                    v.quarters = 2;
             }
             std::vector<SampleSet> found(batch);
             std::vector<size_t> searched(batch, 0);
@@ -1052,7 +1068,9 @@ int commandMeasure(std::map<std::string, std::string> const& a)
             } else {
                 const std::vector<Box> boxes = detectBoxes(photos[i]);
                 hits += found(boxes, chosen[i].box);
-                if (std::getenv("MEASURE_VERBOSE") != nullptr && i < 5) {
+                // MEASURE_VERBOSE: the first photos' boxes; =missed: every missed face's
+                if (std::getenv("MEASURE_VERBOSE") != nullptr &&
+                    (i < 5 || (std::string(std::getenv("MEASURE_VERBOSE")) == "missed" && !found(boxes, chosen[i].box)))) {
                     std::printf("  %s truth %.0f %.0f %.0f:", chosen[i].path.c_str(), chosen[i].box.cx, chosen[i].box.cy,
                                 chosen[i].box.side);
                     for (Box const& b : boxes)
@@ -1214,6 +1232,33 @@ void addMirrored(SampleSet const& set, size_t i, SampleSet& out)
     out.add(patch, set.inverseDeviation(i));
 }
 
+// The training faces of the roll cascade: the boxes' training split, spread
+// down to --faces.
+std::vector<FaceRow> rollTrainFaces(std::map<std::string, std::string> const& a)
+{
+    std::vector<FaceRow> train;
+    for (FaceRow const& r : readBoxes(get(a, "--boxes")))
+        if (r.split == "train")
+            train.push_back(r);
+    const size_t maxFaces = static_cast<size_t>(std::atoi(get(a, "--faces", "4000").c_str()));
+    if (train.size() > maxFaces) {
+        std::vector<FaceRow> spread;
+        for (size_t i = 0; i < maxFaces; ++i)
+            spread.push_back(train[i * train.size() / maxFaces]);
+        train.swap(spread);
+    }
+    return train;
+}
+
+// Positives per category: upright within +-uprightRoll, turned clockwise
+// within the band, and those mirrored (counter-clockwise).
+void rollPositives(std::vector<FaceRow> const& train, TrainConfig const& cfg, double uprightRoll, double bandLo,
+                   double bandHi, uint64_t seed, SampleSet& upright, SampleSet& right, SampleSet& left)
+{
+    turnedSamples(train, cfg, -uprightRoll, uprightRoll, seed, upright, nullptr);
+    turnedSamples(train, cfg, bandLo, bandHi, seed + 1, right, &left);
+}
+
 int commandJointTrain(std::map<std::string, std::string> const& a)
 {
     TrainConfig cfg;
@@ -1228,6 +1273,8 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
     const double uprightRoll = std::atof(get(a, "--upright-roll", "10").c_str());
     const double uprightRouting = std::atof(get(a, "--upright-routing", "0.98").c_str());
     const int faceShare = std::clamp(std::atoi(get(a, "--face-share", "40").c_str()), 0, 100);
+    // branches to train (the upright one may come from the frontal cascade instead)
+    const std::string trainBranches = get(a, "--train-branches", "0,1");
     double bandLo = 12, bandHi = 50;
     std::sscanf(get(a, "--band", "12:50").c_str(), "%lf:%lf", &bandLo, &bandHi);
     const auto start = std::chrono::steady_clock::now();
@@ -1248,18 +1295,9 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
         say("resuming: %zu common stages, branch stages %zu / %zu", jc.common.size(),
             jc.branch.size() > 0 ? jc.branch[0].size() : size_t{0}, jc.branch.size() > 1 ? jc.branch[1].size() : size_t{0});
     jc.branch.resize(2);
-    std::vector<FaceRow> train;
-    for (FaceRow const& r : readBoxes(get(a, "--boxes")))
-        if (r.split == "train")
-            train.push_back(r);
-    const size_t maxFaces = static_cast<size_t>(std::atoi(get(a, "--faces", "4000").c_str()));
-    if (train.size() > maxFaces) {
-        std::vector<FaceRow> spread;
-        for (size_t i = 0; i < maxFaces; ++i)
-            spread.push_back(train[i * train.size() / maxFaces]);
-        train.swap(spread);
-    }
+    const std::vector<FaceRow> train = rollTrainFaces(a);
     Miner miner;
+    miner.minQuarterRoll = std::atof(get(a, "--min-quarter-roll", "0").c_str());
     for (auto const& [path, split] : readList(get(a, "--negatives"))) {
         Gray g;
         if (split == "train" && loadGray(path, g))
@@ -1273,14 +1311,15 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
         for (size_t i = 0; i < train.size() && miner.facePhotos.size() < 1500; i += 2) {
             Gray g;
             if (train[i].source != "dev" && loadGray(train[i].path, g)) {
-                miner.facePhotos.push_back(rotatedAbout(g, train[i].box.cx, train[i].box.cy, roll(rng)));
+                const double r = roll(rng);
+                miner.facePhotos.push_back(rotatedAbout(g, train[i].box.cx, train[i].box.cy, r));
                 miner.faceBoxes.push_back(train[i].box);
+                miner.faceRolls.push_back(r);
             }
         }
     }
     SampleSet upright, right, left;
-    turnedSamples(train, cfg, -uprightRoll, uprightRoll, cfg.seed, upright, nullptr);
-    turnedSamples(train, cfg, bandLo, bandHi, cfg.seed + 1, right, &left);
+    rollPositives(train, cfg, uprightRoll, bandLo, bandHi, cfg.seed, upright, right, left);
     say("%zu faces; positives: upright %zu, turned %zu + %zu mirrored; %zu face-free images, %zu turned face photos",
         train.size(), upright.size(), right.size(), left.size(), miner.images.size(), miner.facePhotos.size());
     FeaturePool pool(2, 2, 0.25f, 1.25f);
@@ -1377,7 +1416,7 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
     // the branches, a stage of each in turn
     for (int k = 0; k < branchStages && !timeUp(); ++k)
         for (size_t b = 0; b < 2 && !timeUp(); ++b) {
-            if (static_cast<int>(jc.branch[b].size()) > k)
+            if (static_cast<int>(jc.branch[b].size()) > k || trainBranches.find(std::to_string(b)) == std::string::npos)
                 continue;
             // every face the common stages send to this branch is its positive,
             // whatever its roll (the counter-clockwise branch's faces mirrored)
@@ -1470,7 +1509,30 @@ int commandJointModel(std::map<std::string, std::string> const& a)
             t += delta;
         // the last common thresholds also set the margins the branch choice compares
     }
-    return CascadeWriter::writeFile(get(a, "--out"), jc.toModel()) ? 0 : 1;
+    // --trace Q0,Q1,...: rejections inside the common stages, at a quantile of the
+    // partial sums of fresh positives (other rolls and jitter than training's)
+    if (!get(a, "--trace").empty()) {
+        TrainConfig cfg;
+        SampleSet upright, right, left;
+        rollPositives(rollTrainFaces(a), cfg, 10, 12, 50, 977, upright, right, left);
+        std::vector<double> quantiles;
+        std::istringstream qs(get(a, "--trace"));
+        for (std::string item; std::getline(qs, item, ',');)
+            quantiles.push_back(std::atof(item.c_str()));
+        jc.traceCommon({&upright, &right, &left}, quantiles);
+    }
+    CascadeModel m = jc.toModel();
+    // --upright-cascade STATE: the frontal cascade finishes the upright
+    // decision, so upright faces meet the cascade they met before
+    if (!get(a, "--upright-cascade").empty()) {
+        Cascade upright;
+        if (!upright.load(get(a, "--upright-cascade"))) {
+            std::cerr << "cannot read the cascade state " << get(a, "--upright-cascade") << "\n";
+            return 1;
+        }
+        m.branches[0] = asBranch(upright.toModel());
+    }
+    return CascadeWriter::writeFile(get(a, "--out"), m) ? 0 : 1;
 }
 
 // Faces found and roll error on report photos turned about the face's centre,

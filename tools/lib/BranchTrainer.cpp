@@ -329,11 +329,60 @@ void JointCascade::commonSums(const uint32_t* integral, float inverseDeviation, 
         alive[c] = inverseDeviation < kGateInverseDeviation;
     }
     for (JointStage const& s : common) {
-        const std::vector<float> add = s.sums(integral, inverseDeviation);
-        for (size_t c = 0; c < K; ++c) {
-            F[c] += add[c];
-            alive[c] = alive[c] && F[c] >= s.thresholds[c];
+        for (size_t j = 0; j < s.stumps.size(); ++j) {
+            JointStump const& st = s.stumps[j];
+            const size_t b = static_cast<size_t>(JointStump::binOf(st.feature.eval(integral, inverseDeviation), st.t));
+            for (size_t c = 0; c < K; ++c) {
+                F[c] += st.out[c][b];
+                if (j < s.early.size())
+                    alive[c] = alive[c] && F[c] >= s.early[j][c];
+            }
         }
+        for (size_t c = 0; c < K; ++c)
+            alive[c] = alive[c] && F[c] >= s.thresholds[c];
+    }
+}
+
+void JointCascade::traceCommon(std::vector<SampleSet const*> const& positives, std::vector<double> const& quantiles)
+{
+    const size_t K = static_cast<size_t>(categories());
+    for (JointStage& s : common)
+        s.early.clear();
+    // partial sums after every stump of every common stage, per category, of
+    // the positives that pass
+    std::vector<std::vector<std::vector<float>>> partial(K);
+    std::vector<float> F(K);
+    std::unique_ptr<bool[]> alive(new bool[K]);
+    for (size_t c = 0; c < K && c < positives.size(); ++c)
+        for (size_t i = 0; i < positives[c]->size(); ++i) {
+            const uint32_t* ii = positives[c]->integral(i);
+            const float inv = positives[c]->inverseDeviation(i);
+            commonSums(ii, inv, F.data(), alive.get());
+            if (!alive[c])
+                continue;
+            float sum = 0.0f;
+            size_t n = 0;
+            for (JointStage const& s : common)
+                for (JointStump const& st : s.stumps) {
+                    sum += st.out[c][static_cast<size_t>(JointStump::binOf(st.feature.eval(ii, inv), st.t))];
+                    if (partial[c].size() <= n)
+                        partial[c].emplace_back();
+                    partial[c][n++].push_back(sum);
+                }
+        }
+    size_t n = 0;
+    for (size_t k = 0; k < common.size(); ++k) {
+        JointStage& s = common[k];
+        s.early.assign(s.stumps.size() - 1, std::vector<float>(K, kNever));
+        for (size_t j = 0; j < s.stumps.size(); ++j, ++n)
+            for (size_t c = 0; c < K && j + 1 < s.stumps.size() && k < quantiles.size() && quantiles[k] >= 0; ++c) {
+                if (n >= partial[c].size() || partial[c][n].empty())
+                    continue;
+                std::vector<float>& v = partial[c][n];
+                const size_t q = std::min(v.size() - 1, static_cast<size_t>(quantiles[k] * static_cast<double>(v.size())));
+                std::nth_element(v.begin(), v.begin() + static_cast<std::ptrdiff_t>(q), v.end());
+                s.early[j][c] = v[q] - 1e-4f;
+            }
     }
 }
 
@@ -439,6 +488,14 @@ void mirrorStages(std::vector<CascadeModelStage>& stages)
 
 } // namespace
 
+std::vector<CascadeModelStage> asBranch(CascadeModel const& single)
+{
+    std::vector<CascadeModelStage> out{zeroAll()};
+    for (size_t i = 1; i < single.common.size(); ++i)
+        out.push_back(single.common[i].feature.kind == 0 && single.common[i].remapFlag != 0 ? zeroAll() : single.common[i]);
+    return out;
+}
+
 CascadeModel JointCascade::toModel() const
 {
     CascadeModel m;
@@ -450,6 +507,8 @@ CascadeModel JointCascade::toModel() const
             std::vector<float> reject(K, kNever);
             if (j + 1 == s.stumps.size())
                 reject = s.thresholds;
+            else if (j < s.early.size())
+                reject = s.early[j];
             m.common.push_back(engineStage(s.stumps[j], 1.0f, first, reject));
             first = false;
         }

@@ -38,6 +38,11 @@ struct JointStage {
     std::vector<JointStump> stumps;
     std::vector<float> thresholds;
     float medianMargin = 1.0f; // of the positives that pass (sets a branch's score gain)
+    // Per stump but the last, per category: rejection thresholds inside the
+    // stage (empty: only the stage's end rejects). Set after training from
+    // the positives' partial sums, so a window that can't reach the end dies
+    // sooner; not part of the saved state.
+    std::vector<std::vector<float>> early;
     std::vector<float> sums(const uint32_t* integral, float inverseDeviation) const;
 };
 
@@ -79,10 +84,19 @@ struct JointCascade {
     float margin(int category, float F) const;
     bool branchPasses(size_t b, const uint32_t* integral, float inverseDeviation) const;
     float branchGain(size_t b) const;
+    // Sets the common stages' early thresholds: per category the quantile
+    // (one per common stage; negative: none) of the partial sums of that
+    // category's positives that pass the common stages (0 keeps them all).
+    void traceCommon(std::vector<SampleSet const*> const& positives, std::vector<double> const& quantiles);
     CascadeModel toModel() const;
     bool save(std::string const& path) const;
     bool load(std::string const& path);
 };
+
+// A one-category cascade (Cascade::toModel) as a branch: its contrast gate
+// dropped (the common stages hold one) and its stage resets zeroing all
+// scores, as a branch starts after the common stages' sums.
+std::vector<CascadeModelStage> asBranch(CascadeModel const& single);
 
 } // namespace cascadetrain
 
