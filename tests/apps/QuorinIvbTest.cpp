@@ -10,6 +10,7 @@
 #include <sys/wait.h>
 
 #include "IvbLayout.h"
+#include "support/ExpectThrow.h"
 #include "support/IvbGolden.h"
 #include "support/SourceTree.h"
 
@@ -61,9 +62,7 @@ TEST(QuorinIvb, DamageIsRefusedWithItsPlace) {
     }
     EXPECT_NO_THROW(qivb::describe(nested(qivb::kMaxDepth)));
     // Every cut of a stream is damage, never a crash or a partial answer.
-    const Bytes stream = ivbgolden::streamWithOneObject();
-    for (std::size_t n = 0; n < stream.size(); ++n)
-        EXPECT_THROW(qivb::describe(Bytes(stream.begin(), stream.begin() + static_cast<long>(n))), qivb::Damage) << n;
+    expectEveryCutThrows<qivb::Damage>(ivbgolden::streamWithOneObject(), [](const Bytes& cut) { qivb::describe(cut); });
 }
 
 TEST(QuorinIvb, ExitCodes) {

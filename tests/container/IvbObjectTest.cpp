@@ -186,9 +186,7 @@ TEST(IvbUnpacker, MalformedCompositesAreRefused) {
 }
 
 TEST(IvbUnpacker, EveryBlobTruncationIsRefused) {
-    const Bytes blobBytes = ivbgolden::byteBlob();
-    for (std::size_t n = 0; n < blobBytes.size(); ++n)
-        EXPECT_THROW(DataBlob().fromIvb(Bytes(blobBytes.begin(), blobBytes.begin() + n)), qv_ivb_conversion_error) << n;
+    expectEveryCutThrows<qv_ivb_conversion_error>(ivbgolden::byteBlob(), [](const Bytes& cut) { DataBlob().fromIvb(cut); });
 }
 
 TEST(IvbUnpacker, CountsThatDisagreeWithTheDataAreRefusedBeforeAllocating) {

@@ -153,11 +153,8 @@ TEST(NetReader, RefusesBadSizesAndEveryTruncation) {
     b = good;
     b.insert(b.end(), {0, 0});  // trailing bytes behind the size word are allowed
     EXPECT_NO_THROW(net.loadBuffer(b.data(), b.size()));
-    for (size_t n = 0; n < good.size(); ++n) {
-        // A copy of exactly n bytes, so that ASan sees any read past it.
-        std::vector<uint8_t> cut(good.begin(), good.begin() + n);
-        EXPECT_THROW(net.loadBuffer(cut.empty() ? nullptr : cut.data(), n), qv_operation_error) << n;
-    }
+    expectEveryCutThrows<qv_operation_error>(
+        good, [&](const auto& cut) { net.loadBuffer(cut.empty() ? nullptr : cut.data(), cut.size()); });
 }
 
 TEST(NetReader, FailedLoadKeepsThePreviousNetRunning) {

@@ -124,16 +124,14 @@ TEST(SvmDecision, WrongFeatureLengthOrNoModelIsRefused)
 
 TEST(SvmModelLoad, EveryTruncationIsADataError)
 {
-    std::vector<uint8_t> full = postfilterwriters::svmModelPayload(twoClassParams(0), threeClassParams({0, 0, 0}));
-    for (std::size_t n = 0; n < full.size(); ++n) {
-        ScopedModel model("pf_svm_cut", std::vector<uint8_t>(full.begin(), full.begin() + n));
-        ModelReader reader("pf_svm_cut", ModelReader::RAW);
-        SvmClassifier a, b;
-        EXPECT_THROW({
+    expectEveryCutThrows<qv_data_error>(
+        postfilterwriters::svmModelPayload(twoClassParams(0), threeClassParams({0, 0, 0})), [](const auto& cut) {
+            ScopedModel model("pf_svm_cut", cut);
+            ModelReader reader("pf_svm_cut", ModelReader::RAW);
+            SvmClassifier a, b;
             a.init(reader);
             b.init(reader);
-        }, qv_data_error) << "cut at " << n;
-    }
+        });
 }
 
 TEST(SvmModelLoad, RejectsInconsistentModels)
