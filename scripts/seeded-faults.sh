@@ -116,7 +116,7 @@ mkdir -p "$TEST_TMPDIR"
 # a fault in a source file and take half the suite's time: left out. The
 # minutes-long tests run last, so that most faults are caught by a quick test.
 SKIP='^(public_headers_stand_alone|packaging_install_and_hosts)$'
-SLOW='^(TrackingLongRun|CascadeAgreement)\.'
+SLOW='^(TrackingLongRun)\.'
 suite() {
   (cd "$BUILD" && ctest -j"$JOBS" --timeout "$TEST_TIMEOUT" --stop-on-failure -E "$SKIP|$SLOW" >"$WORK/ctest.log" 2>&1 &&
     ctest -j"$JOBS" --timeout "$TEST_TIMEOUT" --stop-on-failure -R "$SLOW" >>"$WORK/ctest.log" 2>&1)
