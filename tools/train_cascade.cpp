@@ -30,7 +30,7 @@
 //       training photos turned about the face centre (upright within
 //       --upright-roll, turned within the band). Resumes from WORK/joint.txt.
 //   train_cascade joint-model --work DIR --out FILE [--branch-stages N] [--bias B] [--raise K:D,...]
-//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV]
+//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV] [--turned-score-scale S]
 //       The engine payload of a joint-train state; --upright-cascade puts a
 //       frontal cascade's stages (train's state) in the upright branch;
 //       --trace adds rejections inside common stage K that keep all but the
@@ -1008,6 +1008,30 @@ struct Served {
     }
 };
 
+// Why a face is missed: the cascade's raw hits (category, score, window) on a
+// photo shrunk to --side, then the public entry's boxes in --mode.
+int commandRawHits(std::map<std::string, std::string> const& a)
+{
+    Served served;
+    Gray photo;
+    if (!served.serve(a) || !loadGray(get(a, "--image"), photo))
+        return 1;
+    const Gray g = shrunk(photo, std::atoi(get(a, "--side", "320").c_str()));
+    CascadeDetector d(R"({"model":"mdcb","imageMaxSize":1024,"faceMinSize":24,"faceMaxSize":1024})");
+    IN_IMAGE image;
+    std::vector<ScoredWindow> hits;
+    if (searchWhole(d, g, std::strtof(get(a, "--step", "0.1").c_str(), nullptr), 24, image, hits))
+        for (ScoredWindow const& h : hits)
+            std::printf("hit %d %.2f %d %d %d %d\n", h.category, static_cast<double>(h.score), h.window.left, h.window.top,
+                        h.window.right, h.window.bottom);
+    quorin_init();
+    quorin_setDetectionMode(static_cast<unsigned>(std::atoi(get(a, "--mode", "2").c_str())));
+    for (Box const& b : detectBoxes(photo))
+        std::printf("box %.0f %.0f %.0f\n", b.cx, b.cy, b.side);
+    quorin_release();
+    return 0;
+}
+
 int commandMeasure(std::map<std::string, std::string> const& a)
 {
     Served served;
@@ -1494,6 +1518,8 @@ int commandJointModel(std::map<std::string, std::string> const& a)
             b.resize(static_cast<size_t>(stages));
     if (!get(a, "--bias").empty())
         jc.uprightBias = std::strtof(get(a, "--bias").c_str(), nullptr);
+    if (!get(a, "--turned-score-scale").empty())
+        jc.turnedScoreScale = std::strtof(get(a, "--turned-score-scale").c_str(), nullptr);
     // --raise K:D,...: common stage K's thresholds raised by D for every
     // category, trading a little recall for fewer features per window
     std::istringstream raise(get(a, "--raise"));
@@ -1694,6 +1720,8 @@ int main(int argc, char** argv)
         return commandJointModel(a);
     if (cmd == "roll-measure")
         return commandRollMeasure(a);
+    if (cmd == "raw-hits")
+        return commandRawHits(a);
     std::cerr << kUsage;
     return 2;
 }
