@@ -1,29 +1,37 @@
 #!/usr/bin/env python3
 """Faces found and false hits of quorin-detect with and without --min-face,
-next to OpenCV's frontal Haar cascade, on the labelled development photos.
+next to OpenCV's frontal Haar cascade, on labelled photos.
 
-Reads the teacher labels (labels/faces.jsonl of the data cache), takes the
-photos they label, writes them as PNG at their own size and shrunk to a long
-side of 320 (where faces get small), and for each set runs quorin-detect over
-the whole list (with --json, under `script` so that its progress line reports
-the engine's ms/image) and OpenCV's detectMultiScale on one thread with its
-default parameters (scale 1.1, 3 neighbours, smallest face 24). A labelled
-face is found when a detection overlaps it with IoU >= 0.4 (one detection per
-face, best overlap first); every other detection is a false hit. Prints a
-Markdown table. Deterministic apart from the times.
+Two sets: the development photos with their teacher labels (labels/faces.jsonl
+of the data cache), written as PNG; and group photos composed from the
+Congress portraits of the face data (congress-train.tar): 500 x 375 photos
+tiled with portraits shrunk so that the faces measure from about 20 to 74
+pixels, labelled by construction (a portrait counts only where OpenCV's cascade
+and our C API, at the portrait's full size, each find exactly one face and
+agree with IoU >= 0.5; the label is the mean of the two boxes, shrunk with the
+portrait). For each set quorin-detect runs over the whole list (with --json,
+under `script` so that its progress line reports the engine's ms/image), and
+OpenCV's detectMultiScale on one thread with its default parameters (scale
+1.1, 3 neighbours, smallest face 24). A labelled face is found when a
+detection overlaps it with IoU >= 0.4 (one detection per face, best overlap
+first); every other detection is a false hit. Prints a Markdown table.
+Deterministic apart from the times.
 
-  python3 bench/compare/min_face.py --detect build/apps/quorin-detect/quorin-detect
+  /usr/bin/python3 bench/compare/min_face.py --detect build/apps/quorin-detect/quorin-detect \
+      --faces ../shared/data/faces
 """
 import argparse
 import json
 import os
 import re
+import tarfile
 import statistics
 import subprocess
 import tempfile
 import time
 
 import cv2
+import numpy
 
 
 def iou(a, b):
@@ -79,49 +87,85 @@ def run_opencv(cascade, photos, repeats):
     return boxes, sum(times) / len(times)
 
 
+def development_photos(data, work):
+    photos, truth = [], {}
+    for line in open(os.path.join(data, "labels/faces.jsonl")):
+        rec = json.loads(line)
+        if rec["image"].startswith("photos/"):
+            path = os.path.join(work, "dev-" + os.path.basename(rec["image"]) + ".png")
+            cv2.imwrite(path, cv2.imread(os.path.join(data, rec["image"])))
+            photos.append(path)
+            truth[path] = [f["rect"] for f in rec["faces"]]
+    return photos, truth
+
+
+def group_photos(detect, faces_dir, cascade, work, count):
+    with tarfile.open(os.path.join(faces_dir, "congress-train.tar")) as tar:
+        members = sorted((m for m in tar.getmembers() if m.name.endswith(".jpg")), key=lambda m: m.name)[::3]
+        tar.extractall(work, members=members)
+    names = [os.path.join(work, m.name) for m in members]
+    ours, _ = run_ours(detect, names, [], 1)
+    portraits = []
+    for n in names:
+        gray = cv2.imread(n, cv2.IMREAD_GRAYSCALE)
+        theirs = [(x, y, x + w, y + h) for (x, y, w, h) in cascade.detectMultiScale(gray, 1.1, 5, minSize=(60, 60))]
+        mine = ours.get(n, [])
+        if len(theirs) == 1 and len(mine) == 1 and iou(theirs[0], mine[0]) >= 0.5:
+            portraits.append((gray, [(a + b) / 2 for a, b in zip(theirs[0], mine[0])]))
+    photos, truth, k = [], {}, 0
+    for i in range(count):
+        s = 0.20 + 0.30 * i / max(1, count - 1)  # faces of about 20 to 74 pixels
+        canvas = numpy.full((375, 500), 128, numpy.uint8)
+        boxes = []
+        cw, ch = round(200 * s), round(250 * s)
+        for row in range(375 // ch):
+            for col in range(500 // cw):
+                gray, box = portraits[k % len(portraits)]
+                k += 1
+                x0, y0 = col * cw, row * ch
+                canvas[y0:y0 + ch, x0:x0 + cw] = cv2.resize(gray, (cw, ch), interpolation=cv2.INTER_AREA)
+                boxes.append([x0 + box[0] * cw / 200, y0 + box[1] * ch / 250, x0 + box[2] * cw / 200, y0 + box[3] * ch / 250])
+        path = os.path.join(work, "group-%02d.png" % i)
+        cv2.imwrite(path, canvas)
+        photos.append(path)
+        truth[path] = boxes
+    return photos, truth, len(portraits), len(names)
+
+
+def evaluate(what, photos, truth, detect, cascade, min_faces, repeats):
+    runs = [("quorin-detect (C API, mode 2)", run_ours(detect, photos, [], repeats))]
+    for m in min_faces:
+        runs.append(("quorin-detect --min-face %d" % m, run_ours(detect, photos, ["--min-face", str(m)], repeats)))
+    runs.append(("OpenCV cascade (1.1, 3, min 24)", run_opencv(cascade, photos, repeats)))
+    labelled = sum(len(t) for t in truth.values())
+    for name, (boxes, ms) in runs:
+        found = false = 0
+        for p in photos:
+            f, x = score(truth[p], boxes.get(p, []))
+            found += f
+            false += x
+        print("| %s | %s | %d | %d | %d | %.2f |" % (what, name, labelled, found, false, ms), flush=True)
+
+
 def main():
     ap = argparse.ArgumentParser(description=__doc__.split("\n")[0])
     ap.add_argument("--detect", required=True, help="the quorin-detect program")
     ap.add_argument("--data", default=os.environ.get("QUORIN_DATA_DIR", os.path.expanduser("~/.cache/quorin")))
+    ap.add_argument("--faces", help="the face data folder with congress-train.tar (the group photos)")
+    ap.add_argument("--groups", type=int, default=12, help="group photos to compose")
     ap.add_argument("--min-face", type=int, nargs="+", default=[24, 32])
     ap.add_argument("--repeats", type=int, default=3)
     args = ap.parse_args()
     cascade = cv2.CascadeClassifier("/usr/share/opencv4/haarcascades/haarcascade_frontalface_default.xml")
-
-    labels = {}
-    for line in open(os.path.join(args.data, "labels/faces.jsonl")):
-        rec = json.loads(line)
-        if rec["image"].startswith("photos/"):
-            labels[rec["image"]] = [f["rect"] for f in rec["faces"]]
-
     print("| photos | detector | labelled | found | false hits | ms/photo |")
     print("|---|---|---|---|---|---|")
     with tempfile.TemporaryDirectory() as work:
-        for long_side in (None, 320):
-            photos, truth = [], {}
-            for name, rects in sorted(labels.items()):
-                img = cv2.imread(os.path.join(args.data, name))
-                s = 1.0 if long_side is None else long_side / max(img.shape[:2])
-                if s != 1.0:
-                    img = cv2.resize(img, (round(img.shape[1] * s), round(img.shape[0] * s)), interpolation=cv2.INTER_AREA)
-                path = os.path.join(work, "%s-%s.png" % (long_side or "full", os.path.basename(name)))
-                cv2.imwrite(path, img)
-                photos.append(path)
-                truth[path] = [[v * s for v in r] for r in rects]
-            runs = [("quorin-detect (C API, mode 2)", run_ours(args.detect, photos, [], args.repeats))]
-            for m in args.min_face:
-                runs.append(("quorin-detect --min-face %d" % m,
-                             run_ours(args.detect, photos, ["--min-face", str(m)], args.repeats)))
-            runs.append(("OpenCV cascade (1.1, 3, min 24)", run_opencv(cascade, photos, args.repeats)))
-            labelled = sum(len(t) for t in truth.values())
-            what = "%d as fetched" % len(photos) if long_side is None else "%d, long side %d" % (len(photos), long_side)
-            for name, (boxes, ms) in runs:
-                found = false = 0
-                for p in photos:
-                    f, x = score(truth[p], boxes.get(p, []))
-                    found += f
-                    false += x
-                print("| %s | %s | %d | %d | %d | %.2f |" % (what, name, labelled, found, false, ms))
+        photos, truth = development_photos(args.data, work)
+        evaluate("%d development photos" % len(photos), photos, truth, args.detect, cascade, args.min_face, args.repeats)
+        if args.faces:
+            photos, truth, used, tried = group_photos(args.detect, args.faces, cascade, work, args.groups)
+            evaluate("%d group photos (%d of %d portraits)" % (len(photos), used, tried), photos, truth, args.detect,
+                     cascade, args.min_face, args.repeats)
 
 
 if __name__ == "__main__":
