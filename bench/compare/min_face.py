@@ -27,31 +27,16 @@ import re
 import tarfile
 import statistics
 import subprocess
+import sys
 import tempfile
 import time
 
 import cv2
 import numpy
 
-
-def iou(a, b):
-    w = min(a[2], b[2]) - max(a[0], b[0])
-    h = min(a[3], b[3]) - max(a[1], b[1])
-    if w <= 0 or h <= 0:
-        return 0.0
-    inter = w * h
-    return inter / ((a[2] - a[0]) * (a[3] - a[1]) + (b[2] - b[0]) * (b[3] - b[1]) - inter)
-
-
-def score(truth, found):
-    """(labelled faces found, false hits) for one photo."""
-    pairs = sorted(((iou(t, f), i, j) for i, t in enumerate(truth) for j, f in enumerate(found)), reverse=True)
-    used_t, used_f = set(), set()
-    for v, i, j in pairs:
-        if v >= 0.4 and i not in used_t and j not in used_f:
-            used_t.add(i)
-            used_f.add(j)
-    return len(used_t), len(found) - len(used_f)
+# The one-to-one matching of the detection report (IoU >= 0.4, best overlap first).
+sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "..", "tools"))
+from report_detection import iou, score  # noqa: E402
 
 
 def run_ours(detect, photos, extra, repeats):
