@@ -67,7 +67,9 @@ public final class Detect {
 
     /** The photo in gray, weighted 0.299, 0.587, 0.114 and rounded as quorin-detect does; alpha is ignored. */
     static Gray loadGray(String path) throws IOException {
-        BufferedImage image = ImageIO.read(new File(path));
+        File file = new File(path);
+        if (!file.isFile()) throw new IOException("'" + path + "': no such file");
+        BufferedImage image = ImageIO.read(file);
         if (image == null) throw new IOException("'" + path + "': not an image the JDK can read");
         final int w = image.getWidth(), h = image.getHeight();
         byte[] gray = new byte[w * h];
