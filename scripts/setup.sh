@@ -11,6 +11,7 @@ PKGS=(
   libdlib-dev libdlib-data
   ffmpeg nodejs npm opencv-doc
   clang-14 libclang-rt-14-dev
+  openjdk-17-jdk-headless junit5
 )
 missing=()
 for p in "${PKGS[@]}"; do

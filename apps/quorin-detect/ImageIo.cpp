@@ -1,8 +1,11 @@
 #include "ImageIo.h"
 
+#include <algorithm>
+#include <cctype>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <filesystem>
 #include <limits>
 #include <memory>
 
@@ -79,6 +82,22 @@ Image loadImage(const std::string& path) {
   } catch (const ImageError& e) {
     throw ImageError("'" + path + "': " + e.what());
   }
+}
+
+std::vector<std::string> imageFiles(const std::string& path) {
+  namespace fs = std::filesystem;
+  std::error_code ec;
+  if (!fs::is_directory(path, ec)) return {path};
+  std::vector<std::string> files;
+  for (fs::directory_iterator it(path, ec), end; !ec && it != end; it.increment(ec)) {
+    std::string ext = it->path().extension().string();
+    for (char& c : ext) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+    if ((ext == ".jpg" || ext == ".jpeg" || ext == ".png" || ext == ".pgm" || ext == ".ppm") && it->is_regular_file(ec))
+      files.push_back(it->path().string());
+  }
+  if (ec) throw ImageError("cannot list '" + path + "': " + ec.message());
+  std::sort(files.begin(), files.end());
+  return files;
 }
 
 Image toGray(const Image& image) {

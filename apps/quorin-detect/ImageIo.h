@@ -35,6 +35,12 @@ Image decodeImage(const std::vector<std::uint8_t>& bytes);
 // Reads a whole file; throws ImageError with the system's reason.
 std::vector<std::uint8_t> readFileBytes(const std::string& path);
 
+// The images a command-line argument stands for: a directory's files with an
+// image extension (.jpg, .jpeg, .png, .pgm, .ppm, any case) in name order, not
+// descending; any other path as it is. Throws ImageError if a directory can't
+// be listed.
+std::vector<std::string> imageFiles(const std::string& path);
+
 // Reads and decodes; errors name the file.
 Image loadImage(const std::string& path);
 

@@ -100,6 +100,11 @@ Options parseOptions(const std::vector<std::string>& args) {
       std::string v = takeValue();
       o.tracker = trackerModeFromName(v);
       if (o.tracker == 0) throw UsageError("--tracker wants simple, kf, pf or cpf, not '" + v + "'");
+    } else if (arg == "--min-face") {
+      std::string v = takeValue();
+      if (!parseInt(v, 24, kMaxImageSide, o.minFace))
+        throw UsageError("--min-face wants a face side in pixels from 24 (the cascade's window) to " +
+                         std::to_string(kMaxImageSide) + ", not '" + v + "'");
     } else if (arg == "--") {
       for (++i; i < args.size(); ++i) o.images.push_back(args[i]);
     } else if (arg.size() > 1 && arg[0] == '-') {
@@ -123,23 +128,28 @@ Options parseOptions(const std::vector<std::string>& args) {
   if (o.tracker != 0 && !o.raw) throw UsageError("--tracker is for --raw streams");
   if (o.tracker != 0 && (o.search360 || o.scaled || modeGiven || o.rotation != 0))
     throw UsageError("--tracker runs the tracking mode on upright frames; drop --360, --scaled, --mode and --rotation");
+  if (o.minFace != 0 && o.raw) throw UsageError("--min-face is for photos; --raw streams go through the C API");
+  if (o.minFace != 0 && (o.search360 || o.scaled || modeGiven || o.rotationGiven))
+    throw UsageError("--min-face searches the upright photo at full resolution; drop --360, --scaled, --mode and --rotation");
   if (!o.jvwPath.empty() && (o.jvwPath == o.jsonPath || o.jvwPath == o.annotatePath))
     throw UsageError("--jvw needs a file of its own");
   return o;
 }
 
 std::string usageText() {
-  return R"(Usage: quorin-detect [OPTIONS] IMAGE...
+  return R"(Usage: quorin-detect [OPTIONS] IMAGE|DIRECTORY...
        quorin-detect [OPTIONS] --raw WxH < frames
 
 Finds faces with libquorinapi. Images (JPEG, PNG, binary PGM/PPM) are turned to
-gray and detected one by one; each gives one JSON line on stdout:
+gray and detected one by one (a directory stands for the images in it, in
+name order); each gives one JSON line on stdout:
   {"file":..,"width":..,"height":..,"entry":..,"coordinates":..,"faces":[
     {"rect":{"left","top","right","bottom"},
      "landmarks":{"leftEye":[x,y],"rightEye","nose","leftMouthCorner","rightMouthCorner"},
      "roll":degrees}]}
 "coordinates" is "frame" (pixels of the frame turned by the rotation) or
-"scaled" (-1000..1000 on the axes of the frame as given).
+"scaled" (-1000..1000 on the axes of the frame as given). Several images show
+a progress line on stderr when it is a terminal.
 
 With --raw WxH, stdin carries consecutive 8-bit gray frames of W*H bytes (as
 `ffmpeg -i clip.mp4 -f rawvideo -pix_fmt gray -` writes them); the frames go
@@ -161,6 +171,12 @@ Options:
                      FaceDetector class instead of the C API (whose tracking
                      mode is Kalman); frames as the tracking mode takes them,
                      upright only; faces carry rectangles, landmarks are 0
+  --min-face N       find faces from N pixels up (at least 24) on the photo at
+                     full resolution, through the library's FaceDetectionApi
+                     class (up to about 850 pixels), instead of the C API's
+                     work frame and its smallest face of an eighth of the
+                     work frame's shorter side; upright photos only, the
+                     output names "entry":"FaceDetectionApi" and "minFace"
   --max-faces N      report at most N faces (1..100, default 100)
   --annotate OUT.png draw rectangles and landmarks onto the image (one image)
   --annotate-raw     with --raw: write the frames, annotated, to stdout

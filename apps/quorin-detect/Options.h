@@ -27,6 +27,7 @@ struct Options {
   std::string jsonPath;
   std::string jvwPath;
   int tracker = 0;  // 1..4: --tracker, the raw path through FaceDetector; 0: the C API
+  int minFace = 0;  // --min-face: smallest face for the full-resolution photo path; 0: the C API
   std::vector<std::string> images;
 
   int effectiveMode() const { return mode >= 0 ? mode : (raw ? 1 : 2); }

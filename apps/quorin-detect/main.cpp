@@ -13,8 +13,6 @@
 #include <string>
 #include <vector>
 
-#include <unistd.h>
-
 #include "Annotate.h"
 #include "Engine.h"
 #include "Faces.h"
@@ -22,6 +20,8 @@
 #include "Json.h"
 #include "JvwOutput.h"
 #include "Options.h"
+#include "PhotoSession.h"
+#include "Progress.h"
 #include "RawStream.h"
 #include "TrackerSession.h"
 
@@ -48,6 +48,7 @@ struct JsonSink {
 };
 
 std::string frameFields(const Options& o, Entry entry) {
+  if (o.minFace != 0) return ",\"entry\":\"FaceDetectionApi\",\"minFace\":" + std::to_string(o.minFace) + ",\"coordinates\":\"frame\"";
   std::string s = ",\"entry\":" + jsonString(entryName(entry));
   if (!o.search360) s += ",\"mode\":" + std::to_string(o.effectiveMode()) + ",\"rotation\":" + std::to_string(o.rotation);
   s += std::string(",\"coordinates\":") + (entryCoordinates(entry) == Coordinates::Scaled ? "\"scaled\"" : "\"frame\"");
@@ -65,10 +66,31 @@ int worse(int a, int b) { return a > b ? a : b; }
 
 int runImages(const Options& o, JsonSink& json, JvwOutput* jvw) {
   std::unique_ptr<EngineSession> engine;
-  std::unique_ptr<TrackerSession> tracked;  // --tracker: FaceDetector instead of the C API
+  std::unique_ptr<PhotoSession> photos;  // --min-face: FaceDetectionApi on the full-resolution photo
   const Entry entry = chooseEntry(o);
   int status = kOk;
-  for (const std::string& path : o.images) {
+  std::vector<std::string> files;
+  for (const std::string& arg : o.images) {
+    try {
+      std::vector<std::string> found = imageFiles(arg);
+      if (found.empty()) throw ImageError("'" + arg + "' holds no images (.jpg, .jpeg, .png, .pgm, .ppm)");
+      files.insert(files.end(), found.begin(), found.end());
+    } catch (const ImageError& e) {
+      complain(e.what());
+      status = worse(status, kInputFailed);
+    }
+  }
+  if (!o.annotatePath.empty() && files.size() != 1) {
+    complain("--annotate takes exactly one image, and the arguments stand for " + std::to_string(files.size()));
+    return kUsage;
+  }
+  Progress progress("image", static_cast<long>(files.size()));
+  long done = 0;
+  std::size_t facesSoFar = 0;
+  double engineMs = 0.0;
+  for (const std::string& path : files) {
+    if (files.size() > 1) progress.step(done, facesSoFar, engineMs);
+    ++done;
     auto fail = [&](const std::string& message, int code) {
       complain(message);
       json.line("{\"file\":" + jsonString(path) + ",\"error\":" + jsonString(message) + "}");
@@ -86,10 +108,14 @@ int runImages(const Options& o, JsonSink& json, JvwOutput* jvw) {
       fail("'" + path + "': " + problem, kInputFailed);
       continue;
     }
-    if (!engine) {
+    if (!engine && !photos) {
       try {
-        engine = std::make_unique<EngineSession>(o);
+        if (o.minFace != 0)
+          photos = std::make_unique<PhotoSession>(o.minFace);
+        else
+          engine = std::make_unique<EngineSession>(o);
       } catch (const EngineError& e) {
+        progress.finish(done - 1, facesSoFar, engineMs);
         complain(e.what());
         return worse(status, kEngineFailed);
       }
@@ -97,11 +123,19 @@ int runImages(const Options& o, JsonSink& json, JvwOutput* jvw) {
     FrameResult result;
     try {
       Image gray = toGray(colour);
-      result = engine->detect(gray.pixels, gray.width, gray.height);
+      const auto t0 = std::chrono::steady_clock::now();
+      if (photos) {
+        result = photos->detect(gray.pixels, gray.width, gray.height);
+        if (result.faces.size() > static_cast<std::size_t>(o.maxFaces)) result.faces.resize(o.maxFaces);
+      } else {
+        result = engine->detect(gray.pixels, gray.width, gray.height);
+      }
+      engineMs += std::chrono::duration<double, std::milli>(std::chrono::steady_clock::now() - t0).count();
     } catch (const EngineError& e) {
       fail("'" + path + "': " + e.what(), kEngineFailed);
       continue;
     }
+    facesSoFar += result.faces.size();
     json.line("{\"file\":" + jsonString(path) + ",\"width\":" + std::to_string(colour.width) +
               ",\"height\":" + std::to_string(colour.height) + frameFields(o, entry) +
               ",\"faces\":" + facesJson(result.faces) + "}");
@@ -119,35 +153,9 @@ int runImages(const Options& o, JsonSink& json, JvwOutput* jvw) {
       }
     }
   }
+  if (files.size() > 1) progress.finish(done, facesSoFar, engineMs);
   return status;
 }
-
-class Progress {
- public:
-  Progress() : enabled_(isatty(STDERR_FILENO) == 1), last_(Clock::now()) {}
-  void frame(long frames, std::size_t faces, double engineMs) {
-    if (!enabled_) return;
-    auto now = Clock::now();
-    if (now - last_ < std::chrono::milliseconds(200)) return;
-    last_ = now;
-    show(frames, faces, engineMs);
-  }
-  void finish(long frames, std::size_t faces, double engineMs) {
-    if (!enabled_) return;
-    show(frames, faces, engineMs);
-    std::fputc('\n', stderr);
-  }
-
- private:
-  using Clock = std::chrono::steady_clock;
-  void show(long frames, std::size_t faces, double engineMs) {
-    std::fprintf(stderr, "\rframe %ld  faces %zu  %.2f ms/frame   ", frames, faces,
-                 frames > 0 ? engineMs / static_cast<double>(frames) : 0.0);
-    std::fflush(stderr);
-  }
-  bool enabled_;
-  Clock::time_point last_;
-};
 
 int runRaw(const Options& o, JsonSink& json, JvwOutput* jvw) {
   const int width = o.rawWidth, height = o.rawHeight;
@@ -167,7 +175,7 @@ int runRaw(const Options& o, JsonSink& json, JvwOutput* jvw) {
   canvas.width = width;
   canvas.height = height;
   canvas.channels = 1;
-  Progress progress;
+  Progress progress("frame");
   long frames = 0;
   std::size_t lastFaces = 0;
   double engineMs = 0.0;
@@ -236,7 +244,7 @@ int runRaw(const Options& o, JsonSink& json, JvwOutput* jvw) {
     }
     ++frames;
     lastFaces = result.faces.size();
-    progress.frame(frames, lastFaces, engineMs);
+    progress.step(frames, lastFaces, engineMs);
   }
   progress.finish(frames, lastFaces, engineMs);
   if (frames == 0) {

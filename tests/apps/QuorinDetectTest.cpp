@@ -26,6 +26,7 @@
 #include "support/DevData.h"
 #include "support/SourceTree.h"
 #include "Options.h"
+#include "PhotoSession.h"
 
 using namespace qcli;
 using Bytes = std::vector<std::uint8_t>;
@@ -146,8 +147,30 @@ TEST(OptionParsing, RefusesBadValuesAndContradictions) {
            {"--bogus", "a.png"}, {"--raw", "0x10"}, {"--raw", "99999x10"}, {"--raw", "99999999999999x1"}, {},
            {"--tracker", "KF", "--raw", "8x8"}, {"--raw", "8x8", "a.png"}, {"--annotate", "o.png", "a.png", "b.png"},
            {"--360", "--rotation", "90", "a.png"}, {"--360", "--jvw", "f.jvw", "a.png"}, {"--tracker", "kf", "a.png"},
-           {"--tracker", "pf", "--raw", "8x8", "--scaled"}}) {
+           {"--tracker", "pf", "--raw", "8x8", "--scaled"}, {"--min-face", "23", "a.png"},
+           {"--min-face", "24", "--raw", "8x8"}, {"--min-face", "24", "--rotation", "90", "a.png"}}) {
     EXPECT_THROW(parseOptions(args), UsageError) << ::testing::PrintToString(args);
+  }
+}
+
+TEST(PhotoSession, FindsTheSmallFacesTheWorkFrameRuleLeavesOut) {
+  const std::string photo = devdata::photo("tracking_faces_test.png");
+  if (!devdata::exists(photo)) GTEST_SKIP() << devdata::missingNote();
+  // The three people at a third of their size (faces of about 36 pixels) in a
+  // 600 x 600 frame, where the C entry's smallest face is 75 pixels.
+  const Image gray = toGray(loadImage(photo));
+  Bytes frame(600 * 600, 128);
+  for (int y = 0; y < gray.height / 3; ++y)
+    for (int x = 0; x < gray.width / 3; ++x)
+      frame[static_cast<std::size_t>(200 + y) * 600 + 100 + x] = gray.pixels[static_cast<std::size_t>(3 * y) * gray.width + 3 * x];
+  Bytes copy = frame;
+  EXPECT_EQ(EngineSession(Options{}).detect(copy, 600, 600).faces.size(), 0u);
+  const FrameResult found = PhotoSession(24).detect(frame, 600, 600);
+  ASSERT_EQ(found.faces.size(), 3u);
+  for (const Face& f : found.faces) {
+    EXPECT_TRUE(f.left >= 100 && f.right <= 300 && f.top >= 200 && f.bottom <= 316 && f.right - f.left < 60)
+        << faceJson(f);
+    EXPECT_TRUE(f.leftEye.x < f.rightEye.x && f.nose.y < f.leftMouthCorner.y) << faceJson(f);
   }
 }
 
