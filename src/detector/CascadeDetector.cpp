@@ -298,6 +298,68 @@ void CascadeDetector::ensurePrepared(IN_IMAGE const& image)
     }
 }
 
+namespace {
+
+// One score of a multi-score stage, as CascadeStage::UpdateScoreAndThreshold
+// updates it; true when the score is dead afterwards.
+[[gnu::always_inline]] inline bool updateOne(float& score, float add, float threshold)
+{
+    if (score <= kDeadScore)
+        return true;
+    score += add;
+    if (score < threshold) {
+        score = kDeadScore;
+        return true;
+    }
+    return false;
+}
+
+// Runs `count` stages over one window, their features from `feature`, on
+// `scores`; returns the index of the stage that rejects, or -1. Most stages
+// update the first score alone, and a cascade with three categories updates
+// three: those stay in registers through them and go back to the array for
+// the others (same additions in the same order, so the same results).
+int runStages(CascadeStage const* stages, int count, ScaleFeatures::Cursor feature, uint32_t const* p,
+              float inverseDeviation, float* scores)
+{
+    float first = scores[0], second = scores[1], third = scores[2];
+    for (int i = 0; i < count; ++i, feature.next()) {
+        CascadeStage const& s = stages[i];
+        const float value = feature.value(p, inverseDeviation);
+        bool rejected;
+        if (s.singleScore()) {
+            first += s.binScores[0][s.binOf(value)];
+            rejected = first < s.rejectThreshold[0];
+        } else if (s.scoreCount == 3 && s.remapFlag == 0) {
+            const int bin = s.binOf(value);
+            const bool dead0 = updateOne(first, s.binScores[0][bin], s.rejectThreshold[0]);
+            const bool dead1 = updateOne(second, s.binScores[1][bin], s.rejectThreshold[1]);
+            const bool dead2 = updateOne(third, s.binScores[2][bin], s.rejectThreshold[2]);
+            rejected = dead0 && dead1 && dead2;
+        } else {
+            scores[0] = first;
+            scores[1] = second;
+            scores[2] = third;
+            rejected = s.UpdateScoreAndThreshold(value, scores);
+            first = scores[0];
+            second = scores[1];
+            third = scores[2];
+        }
+        if (rejected) {
+            scores[0] = first;
+            scores[1] = second;
+            scores[2] = third;
+            return i;
+        }
+    }
+    scores[0] = first;
+    scores[1] = second;
+    scores[2] = third;
+    return -1;
+}
+
+} // namespace
+
 bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& window, int scale, float minAverage,
                                ClassifyMode mode, float* score, float* categoryScores, int* stage)
 {
@@ -316,31 +378,13 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     float scores[kMaxCategories] = {};
     uint32_t const* p = image.data + (window.left + image.stride * window.top);
 
-    // Most common stages update the first score alone; it stays in a register
-    // through them and goes back to the array for the others.
     const int commonCount = static_cast<int>(commonStages.size());
-    CascadeStage const* stages = commonStages.data();
-    ScaleFeatures::Cursor feature = features->common();
-    float first = 0.0f;
-    for (int i = 0; i < commonCount; ++i, feature.next()) {
-        CascadeStage const& s = stages[i];
-        const float value = feature.value(p, inverseDeviation);
-        bool rejected;
-        if (s.singleScore()) {
-            first += s.binScores[0][s.binOf(value)];
-            rejected = first < s.rejectThreshold[0];
-        } else {
-            scores[0] = first;
-            rejected = s.UpdateScoreAndThreshold(value, scores);
-            first = scores[0];
-        }
-        if (rejected) {
-            *score = first;
-            *stage = i;
-            return false;
-        }
+    const int rejectedAt = runStages(commonStages.data(), commonCount, features->common(), p, inverseDeviation, scores);
+    if (rejectedAt >= 0) {
+        *score = scores[0];
+        *stage = rejectedAt;
+        return false;
     }
-    scores[0] = first;
 
     const int branches = static_cast<int>(branchStages.size());
     if (branches < 2) {
@@ -360,14 +404,11 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     scores[0] = best;
 
     std::vector<CascadeStage> const& branch = branchStages[bestIndex];
-    ScaleFeatures::Cursor branchFeature = features->branch(bestIndex);
-    const int branchCount = static_cast<int>(branch.size());
-    for (int j = 0; j < branchCount; ++j, branchFeature.next()) {
-        if (branch[j].UpdateScoreAndThreshold(branchFeature.value(p, inverseDeviation), scores)) {
-            *score = scores[0];
-            *stage = commonCount;
-            return false;
-        }
+    if (runStages(branch.data(), static_cast<int>(branch.size()), features->branch(bestIndex), p, inverseDeviation,
+                  scores) >= 0) {
+        *score = scores[0];
+        *stage = commonCount;
+        return false;
     }
     *score = scores[0];
     *stage = bestIndex;
