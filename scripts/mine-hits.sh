@@ -25,9 +25,12 @@ if [ ! -f "$LABELS/faces.jsonl" ]; then
   "$LABEL_FACES" --data "$DATA" --out "$LABELS/faces.jsonl.part"
   mv "$LABELS/faces.jsonl.part" "$LABELS/faces.jsonl"
 fi
-if [ ! -f "$LABELS/hits.tsv" ] || [ ! -f "$LABELS/hits.f32" ]; then
+# The hits belong to the built-in cascade they were mined with: a new one mines again.
+CASCADE="$(sha256sum "$(dirname "$0")/../models/mdcb.bin" | cut -d' ' -f1)"
+if [ ! -f "$LABELS/hits.tsv" ] || [ ! -f "$LABELS/hits.f32" ] || [ "$(cat "$LABELS/hits.cascade" 2>/dev/null)" != "$CASCADE" ]; then
   "$DUMP_HITS" --data "$DATA" --out "$LABELS/hits.part"
   mv "$LABELS/hits.part.f32" "$LABELS/hits.f32"
   mv "$LABELS/hits.part.tsv" "$LABELS/hits.tsv"
+  echo "$CASCADE" > "$LABELS/hits.cascade"
 fi
 echo "mine-hits: labels and mined hits ready in $LABELS"

@@ -178,15 +178,16 @@ TEST_F(RealPhotos, LandmarksLieNearTheTeacherPoints) {
     EXPECT_LT(sum / kPoints.size(), 0.10);
 }
 
-// A face turned in the plane gets a roll angle of the turn's sign and about its
-// size: the photo is turned about the face centre (nearest neighbour) and the
-// teacher's eyes are turned with it.
+// A face turned 30 degrees either way in the plane is still found, with a roll
+// of the turn's sign and within 5 degrees of it (the cascade's turned branches
+// and the roll-trained net): the photo is turned about the face centre
+// (nearest neighbour) and the teacher's eyes are turned with it.
 TEST_F(RealPhotos, RollFollowsAFaceTurnedInThePlane) {
     const qcli::Image gray = qcli::toGray(qcli::loadImage(devdata::photo("SeanConnery.jpg")));
     const Points& p = kPoints[3];
     const double cx = (p.xy[0][0] + p.xy[1][0]) / 2.0, cy = (p.xy[0][1] + p.xy[3][1]) / 2.0;
     const double eyeLine = std::atan2(p.xy[1][1] - p.xy[0][1], p.xy[1][0] - p.xy[0][0]) * 180.0 / kPi;
-    for (double degrees : {-10.0, 15.0}) {
+    for (double degrees : {-30.0, 30.0}) {
         SCOPED_TRACE(degrees);
         const double a = degrees * kPi / 180.0, c = std::cos(a), s = std::sin(a);
         qcli::Image turned = gray;
@@ -204,7 +205,7 @@ TEST_F(RealPhotos, RollFollowsAFaceTurnedInThePlane) {
         const Detection d = detectGray(turned);
         ASSERT_FALSE(d.boxes.empty());
         EXPECT_GT(d.blocks[0] * expected, 0.0) << "roll " << d.blocks[0] << ", expected about " << expected;
-        EXPECT_NEAR(d.blocks[0], expected, 6.0);
+        EXPECT_NEAR(d.blocks[0], expected, 5.0);
     }
 }
 

@@ -66,16 +66,20 @@ TEST(BuiltinPostFilter, KeepsFacesAndRemovesFalseHitsOfTheMinedReportSplit) {
             << "hits.f32 is shorter than hits.tsv";
         std::istringstream fields(line);
         std::string image, variant, longSide;
-        double best = 0.0;
+        double best = 0.0, score = 0.0, left = 0.0, top = 0.0, right = 0.0, bottom = 0.0;
+        int category = 0;
         ASSERT_TRUE(std::getline(fields, image, '\t') && std::getline(fields, variant, '\t') &&
                     std::getline(fields, longSide, '\t') && (fields >> best));
+        // The hit's cascade category picks its model (older dumps have none: 0).
+        if (!(fields >> score >> left >> top >> right >> bottom >> category)) category = 0;
         const auto [which, kind] = splitOf(split, image);
         if (which.empty() || kind == "artwork") continue;
         const bool falseHit = kind == "free" || kind == "nonface" || best < 0.1;
         if (!falseHit && best < 0.4) continue;
         Tally& t = which == "report" ? report : train;
-        // The filter's decision: a fast pass on the cascade score, else the category-0 model.
-        const bool kept = classifier.preClassify(feature[0]) || classifier.classify(0, feature.data(), kFeatureLength);
+        // The filter's decision: a fast pass on the cascade score, else the category's model.
+        const bool kept =
+            classifier.preClassify(feature[0]) || classifier.classify(category, feature.data(), kFeatureLength);
         if (falseHit) {
             ++t.falseHits;
             t.falseRemoved += !kept;

@@ -97,8 +97,8 @@ struct JointCascade {
 };
 
 // A one-category cascade (Cascade::toModel) as a branch: its contrast gate
-// dropped (the common stages hold one) and its stage resets zeroing all
-// scores, as a branch starts after the common stages' sums.
+// dropped (the common stages hold one), behind a stage that zeroes all scores,
+// as a branch starts from the common stages' sums.
 std::vector<CascadeModelStage> asBranch(CascadeModel const& single);
 
 } // namespace cascadetrain
