@@ -35,6 +35,11 @@
 //       frontal cascade's stages (train's state) in the upright branch;
 //       --trace adds rejections inside common stage K that keep all but the
 //       QK quantile of the positives passing them (-1: none).
+//   train_cascade pasted --boxes TSV --negatives LIST [--limit N] [--sizes LO:HI]
+//       Report faces pasted at LO to HI pixels (30:60) into 320 x 240 cuts of
+//       the face-free report images, found in modes 0 and 2.
+//   train_cascade raw-hits --image P [--side S] [--step F] [--mode M]
+//       A photo's raw cascade hits (category, score, window) and the entry's boxes.
 //   train_cascade roll-measure --boxes TSV [--limit N] [--angles A,...] [--modes M,...]
 //       Faces found and mean roll error on report photos turned about the face
 //       centre, through quorin_detect.
@@ -149,6 +154,15 @@ double iou(Box const& a, Box const& b)
 {
     return iou(a.left(), a.top(), a.left() + a.side, a.top() + a.side, b.left(), b.top(), b.left() + b.side,
                b.top() + b.side);
+}
+
+// A labelled face counts as found when some box overlaps it with IoU >= 0.4.
+bool found(std::vector<Box> const& boxes, Box const& truth)
+{
+    for (Box const& b : boxes)
+        if (iou(b, truth) >= 0.4)
+            return true;
+    return false;
 }
 
 uint32_t fnv1a(std::string const& s)
@@ -1032,6 +1046,84 @@ int commandRawHits(std::map<std::string, std::string> const& a)
     return 0;
 }
 
+// Small faces in clutter: report faces pasted (a square twice the face box,
+// nearest neighbour) into 320 x 240 cuts of the face-free report images at
+// --sizes pixels, found through quorin_detect in modes 0 and 2.
+int commandPasted(std::map<std::string, std::string> const& a)
+{
+    Served served;
+    if (!served.serve(a))
+        return 1;
+    std::vector<FaceRow> report;
+    for (FaceRow const& r : readBoxes(get(a, "--boxes")))
+        if (r.split == "report" && r.source != "dev")
+            report.push_back(r);
+    std::vector<Gray> backgrounds;
+    for (auto const& [path, split] : readList(get(a, "--negatives"))) {
+        Gray g;
+        if (split != "report" || !loadGray(path, g))
+            continue;
+        // the short side to 240, then the centre's 320 x 240
+        const int longSide = static_cast<int>(std::ceil(240.0 * std::max(g.width, g.height) / std::min(g.width, g.height)));
+        const Gray s = shrunk(g, longSide);
+        if (s.width < 320 || s.height < 240)
+            continue;
+        Gray cut;
+        cut.width = 320;
+        cut.height = 240;
+        const int x0 = (s.width - 320) / 2, y0 = (s.height - 240) / 2;
+        for (int y = 0; y < 240; ++y)
+            for (int x = 0; x < 320; ++x)
+                cut.pixels.push_back(s.pixels[static_cast<size_t>(y0 + y) * s.width + x0 + x]);
+        backgrounds.push_back(std::move(cut));
+    }
+    const size_t limit = static_cast<size_t>(std::atoi(get(a, "--limit", "300").c_str()));
+    if (backgrounds.empty() || report.empty())
+        return 1;
+    const size_t every = std::max<size_t>(1, report.size() / limit);
+    std::mt19937_64 rng(41);
+    int lo = 30, hi = 60;
+    std::sscanf(get(a, "--sizes", "30:60").c_str(), "%d:%d", &lo, &hi);
+    lo = std::clamp(lo, 24, 100);
+    hi = std::clamp(hi, lo, 100);
+    std::vector<std::pair<Gray, Box>> frames;
+    for (size_t i = 0; i < report.size() && frames.size() < limit; i += every) {
+        Gray photo;
+        if (!loadGray(report[i].path, photo))
+            continue;
+        const double side = lo + static_cast<double>(rng() % static_cast<uint64_t>(hi - lo + 1));
+        const double f = side / report[i].box.side;
+        Gray frame = backgrounds[frames.size() % backgrounds.size()];
+        const int half = static_cast<int>(side);
+        const int cx = half + static_cast<int>(rng() % static_cast<uint64_t>(320 - 2 * half));
+        const int cy = half + static_cast<int>(rng() % static_cast<uint64_t>(240 - 2 * half));
+        for (int y = cy - half; y < cy + half; ++y)
+            for (int x = cx - half; x < cx + half; ++x) {
+                const int sx = static_cast<int>(std::lround(report[i].box.cx + (x - cx) / f));
+                const int sy = static_cast<int>(std::lround(report[i].box.cy + (y - cy) / f));
+                if (sx >= 0 && sy >= 0 && sx < photo.width && sy < photo.height)
+                    frame.pixels[static_cast<size_t>(y) * 320 + x] = photo.pixels[static_cast<size_t>(sy) * photo.width + sx];
+            }
+        frames.push_back({std::move(frame), Box{static_cast<double>(cx), static_cast<double>(cy), side}});
+    }
+    for (int mode : {0, 2}) {
+        quorin_init();
+        quorin_setDetectionMode(static_cast<unsigned>(mode));
+        int hits = 0;
+        size_t other = 0;
+        for (auto const& [frame, truth] : frames) {
+            const std::vector<Box> boxes = detectBoxes(frame);
+            const bool hit = found(boxes, truth);
+            hits += hit;
+            other += boxes.size() - (hit ? 1 : 0);
+        }
+        quorin_release();
+        std::printf("pasted faces %d-%d px in 320 x 240, mode %d: found %d / %zu (%.1f%%), other boxes %zu\n", lo, hi, mode,
+                    hits, frames.size(), 100.0 * hits / std::max<size_t>(1, frames.size()), other);
+    }
+    return 0;
+}
+
 int commandMeasure(std::map<std::string, std::string> const& a)
 {
     Served served;
@@ -1065,12 +1157,6 @@ int commandMeasure(std::map<std::string, std::string> const& a)
             freeImages.push_back(g);
     }
     std::printf("report faces %zu (of %zu), face-free report images %zu\n", chosen.size(), report.size(), freeImages.size());
-    auto found = [](std::vector<Box> const& boxes, Box const& truth) {
-        for (Box const& b : boxes)
-            if (iou(b, truth) >= 0.4)
-                return true;
-        return false;
-    };
     const bool costOnly = get(a, "--cost-only") == "1";
     for (int mode = 0; mode <= 2 && !costOnly; ++mode) {
         int hits = 0;
@@ -1722,6 +1808,8 @@ int main(int argc, char** argv)
         return commandRollMeasure(a);
     if (cmd == "raw-hits")
         return commandRawHits(a);
+    if (cmd == "pasted")
+        return commandPasted(a);
     std::cerr << kUsage;
     return 2;
 }
