@@ -30,7 +30,7 @@
 //       training photos turned about the face centre (upright within
 //       --upright-roll, turned within the band). Resumes from WORK/joint.txt.
 //   train_cascade joint-model --work DIR --out FILE [--branch-stages N] [--bias B] [--raise K:D,...]
-//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV] [--turned-score-scale S]
+//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV]
 //       The engine payload of a joint-train state; --upright-cascade puts a
 //       frontal cascade's stages (train's state) in the upright branch;
 //       --trace adds rejections inside common stage K that keep all but the
@@ -506,6 +506,17 @@ struct FaceRow {
     double roll = 0; // of the labelled eye line, degrees
 };
 
+// Keeps `count` rows spread evenly over the list (all when there are fewer).
+void spreadTo(std::vector<FaceRow>& rows, size_t count)
+{
+    if (rows.size() <= count)
+        return;
+    std::vector<FaceRow> spread;
+    for (size_t i = 0; i < count; ++i)
+        spread.push_back(rows[i * rows.size() / count]);
+    rows.swap(spread);
+}
+
 std::vector<FaceRow> readBoxes(std::string const& path)
 {
     std::vector<FaceRow> rows;
@@ -804,12 +815,7 @@ int commandTrain(std::map<std::string, std::string> const& a)
         miner.images.size(), miner.facePhotos.size());
     // a fixed spread of the training faces when fewer are asked for
     const size_t maxFaces = static_cast<size_t>(std::atoi(get(a, "--faces", "100000").c_str()));
-    if (train.size() > maxFaces) {
-        std::vector<FaceRow> spread;
-        for (size_t i = 0; i < maxFaces; ++i)
-            spread.push_back(train[i * train.size() / maxFaces]);
-        train.swap(spread);
-    }
+    spreadTo(train, maxFaces);
     SampleSet tight, wide;
     positiveSamples(train, cfg, 0.5, cfg.seed, tight);
     positiveSamples(train, cfg, 1.5, cfg.seed + 1, wide);
@@ -1351,12 +1357,7 @@ std::vector<FaceRow> rollTrainFaces(std::map<std::string, std::string> const& a)
         if (r.split == "train")
             train.push_back(r);
     const size_t maxFaces = static_cast<size_t>(std::atoi(get(a, "--faces", "4000").c_str()));
-    if (train.size() > maxFaces) {
-        std::vector<FaceRow> spread;
-        for (size_t i = 0; i < maxFaces; ++i)
-            spread.push_back(train[i * train.size() / maxFaces]);
-        train.swap(spread);
-    }
+    spreadTo(train, maxFaces);
     return train;
 }
 
@@ -1604,8 +1605,6 @@ int commandJointModel(std::map<std::string, std::string> const& a)
             b.resize(static_cast<size_t>(stages));
     if (!get(a, "--bias").empty())
         jc.uprightBias = std::strtof(get(a, "--bias").c_str(), nullptr);
-    if (!get(a, "--turned-score-scale").empty())
-        jc.turnedScoreScale = std::strtof(get(a, "--turned-score-scale").c_str(), nullptr);
     // --raise K:D,...: common stage K's thresholds raised by D for every
     // category, trading a little recall for fewer features per window
     std::istringstream raise(get(a, "--raise"));

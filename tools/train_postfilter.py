@@ -162,9 +162,6 @@ def main(argv=None):
     ap.add_argument('--categories', type=int, default=1,
                     help='cascade categories with a model of their own (the hits\' last column); '
                          'the others take category 0\'s')
-    ap.add_argument('--upright-from', default=None,
-                    help='payload whose category 0 model category 0 keeps (the upright branch is the frontal '
-                         'cascade, whose hits that model was fitted on)')
     args = ap.parse_args(argv)
 
     split = json.load(open(args.split))
@@ -188,9 +185,6 @@ def main(argv=None):
     models = []
     for k in range(args.categories):
         m = train & (cats == k)
-        if k == 0 and args.upright_from:
-            models.append(ilabs.read_ilabs(open(args.upright_from, 'rb').read())[0])
-            continue
         if k > 0 and (labels[m].min(initial=1) == labels[m].max(initial=0)):
             print('category %d: too few hits of both kinds, it takes category 0\'s model' % k)
             models.append(models[0])

@@ -300,20 +300,6 @@ void CascadeDetector::ensurePrepared(IN_IMAGE const& image)
 
 namespace {
 
-// One score of a multi-score stage, as CascadeStage::UpdateScoreAndThreshold
-// updates it; true when the score is dead afterwards.
-[[gnu::always_inline]] inline bool updateOne(float& score, float add, float threshold)
-{
-    if (score <= kDeadScore)
-        return true;
-    score += add;
-    if (score < threshold) {
-        score = kDeadScore;
-        return true;
-    }
-    return false;
-}
-
 // Runs `count` stages over one window, their features from `feature`, on
 // `scores`; returns the index of the stage that rejects, or -1. Most stages
 // update the first score alone, and a cascade with three categories updates
@@ -332,9 +318,9 @@ int runStages(CascadeStage const* stages, int count, ScaleFeatures::Cursor featu
             rejected = first < s.rejectThreshold[0];
         } else if (s.scoreCount == 3 && s.remapFlag == 0) {
             const int bin = s.binOf(value);
-            const bool dead0 = updateOne(first, s.binScores[0][bin], s.rejectThreshold[0]);
-            const bool dead1 = updateOne(second, s.binScores[1][bin], s.rejectThreshold[1]);
-            const bool dead2 = updateOne(third, s.binScores[2][bin], s.rejectThreshold[2]);
+            const bool dead0 = s.updateOne(first, bin, 0);
+            const bool dead1 = s.updateOne(second, bin, 1);
+            const bool dead2 = s.updateOne(third, bin, 2);
             rejected = dead0 && dead1 && dead2;
         } else {
             scores[0] = first;

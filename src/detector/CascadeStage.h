@@ -69,18 +69,23 @@ public:
             return scores[0] < rejectThreshold[0];
         }
         int dead = 0;
-        for (int i = 0; i < scoreCount; ++i) {
-            if (scores[i] <= kDeadScore) {
-                ++dead;
-                continue;
-            }
-            scores[i] += binScores[i][bin];
-            if (scores[i] < rejectThreshold[i]) {
-                scores[i] = kDeadScore;
-                ++dead;
-            }
-        }
+        for (int i = 0; i < scoreCount; ++i)
+            dead += updateOne(scores[i], bin, i);
         return dead == scoreCount;
+    }
+
+    // Score i of a multi-score stage: a dead score stays dead, a live one
+    // adds its bin and dies below its threshold; true when dead afterwards.
+    [[gnu::always_inline]] bool updateOne(float& score, int bin, int i) const
+    {
+        if (score <= kDeadScore)
+            return true;
+        score += binScores[i][bin];
+        if (score < rejectThreshold[i]) {
+            score = kDeadScore;
+            return true;
+        }
+        return false;
     }
 
 private:

@@ -523,7 +523,7 @@ CascadeModel JointCascade::toModel() const
     for (size_t b = 0; b < K; ++b) {
         const size_t source = b == 0 ? 0 : 1 + (b - 1) / 2;
         std::vector<CascadeModelStage> out{zeroAll()};
-        const float g = branchGain(source) * (b == 0 ? 1.0f : turnedScoreScale);
+        const float g = branchGain(source);
         if (source < branch.size())
             for (JointStage const& s : branch[source])
                 for (size_t j = 0; j < s.stumps.size(); ++j)

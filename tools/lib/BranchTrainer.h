@@ -74,9 +74,6 @@ JointStage trainSoftStage(FeaturePool const& pool, std::vector<SampleSet const*>
 struct JointCascade {
     int bands = 1;
     float uprightBias = 0.0f;
-    // Scales the turned branches' scores (not their decisions): where a turned
-    // hit overlaps an upright one, the merger keeps the higher score.
-    float turnedScoreScale = 1.0f;
     std::vector<JointStage> common;            // categories() thresholds each
     std::vector<std::vector<JointStage>> branch; // [0] upright, [1 + b] band b clockwise; one threshold each
     int categories() const { return 1 + 2 * bands; }
