@@ -113,15 +113,6 @@ TEST(SvmDecision, VotesStrictlyAboveTheThresholdAndTiesGoLow)
     EXPECT_EQ(SvmClassifier::powi(5.0f, -2), 1.0f);
 }
 
-TEST(SvmDecision, WrongFeatureLengthOrNoModelIsRefused)
-{
-    SvmClassifier c;
-    const float f[3] = {1, 2, 3};
-    EXPECT_THROW(c.classify(f, 2), qv_unsupported_error);
-    loadInto(c, svmBytes(twoClassParams(0)));
-    expectThrowWith<qv_data_error>([&] { c.classify(f, 3); }, "Incorrect PostFilter's feature length");
-}
-
 TEST(SvmModelLoad, EveryTruncationIsADataError)
 {
     expectEveryCutThrows<qv_data_error>(
