@@ -272,22 +272,7 @@ TEST_F(QuorinApiTest, HighSearchStartsFromTheLastWorkingTurnAndReportsIt) {
                  qv_invalid_argument);
 }
 
-TEST_F(QuorinApiTest, BadFrameArgumentsAreRefusedWithoutChangingTheSession) {
-    Frame frame = patternFrame(64, 48);
-    Blocks out = blocks(1);
-    const SessionSnapshot before = sessionSnapshot();
-    EXPECT_THROW(quorin_detect(nullptr, 64, 48, out.data(), 1, 0), qv_invalid_argument);
-    EXPECT_THROW(quorin_detect(frame.data(), 0, 48, out.data(), 1, 0), qv_invalid_argument);
-    EXPECT_THROW(quorin_detect(frame.data(), 64, 48, nullptr, 1, 0), qv_invalid_argument);
-    EXPECT_THROW(quorin_detect(frame.data(), 65536, 65536, out.data(), 1, 0), qv_invalid_argument);
-    EXPECT_THROW(quorin_detectScaled(frame.data(), 64, 0, out.data(), 1, 0), qv_invalid_argument);
-    EXPECT_THROW(quorin_detect360Tracking(frame.data(), 0, 0, out.data(), 1), qv_invalid_argument);
-    EXPECT_EQ(sessionSnapshot().orientation, before.orientation);
-    EXPECT_EQ(sessionSnapshot().detectionMode, before.detectionMode);
-    EXPECT_TRUE(stages.frames.empty());
-    EXPECT_EQ(out, blocks(1));
-}
-
+// Null and zero-sized frame arguments are left to FuzzQuorinApi.
 TEST_F(QuorinApiTest, FramesOfAnyShapeStayInsideTheBuffers) {
     // Shrunk work frames up to 640 x 640, more than the 320 x 320 turn bound.
     for (auto size : {std::make_pair(1280, 960), std::make_pair(1280, 1280), std::make_pair(4000, 3000)}) {

@@ -77,27 +77,6 @@ TEST(JvwReader, AcceptsSkipsAndRefusesLines) {
     EXPECT_EQ(readFile(scratch() + "/missing.jvw"), kOpenRefused);
 }
 
-TEST(JvwReader, CutFilesEndInTheirWholeRecordsOrTheirErrors) {
-    // A cut file gives the records whole before the cut, with or without their
-    // line feed (the header alone: 0 faces); a record cut short is the reading
-    // error, a header the open error.
-    std::string good = kHeader + "\n";
-    std::vector<std::size_t> lineEnds = {kHeader.size()};
-    for (int i = 0; i < 3; ++i) {
-        good += "{\"obj\":\"FACE\", \"content\":" + sampleFace(i).toJson() + "}";
-        lineEnds.push_back(good.size());
-        good += "\n";
-    }
-    for (std::size_t cut = 0; cut <= good.size(); cut += 3) {
-        std::size_t whole = 0;
-        while (whole + 1 < lineEnds.size() && lineEnds[whole + 1] <= cut) ++whole;
-        const std::string expected = cut < lineEnds[0] ? kOpenRefused
-                                     : cut <= lineEnds[whole] + 1 ? std::to_string(whole) + " faces"
-                                                                  : kReadingError;
-        EXPECT_EQ(readFile(fileWith("cut.jvw", good.substr(0, cut))), expected) << "cut at " << cut;
-    }
-}
-
 TEST(JvwWriter, WritesOneRecordLinePerFaceOnceAndReadsBack) {
     const std::vector<FaceData> faces = {sampleFace(0), sampleFace(1), FaceData()};
     const std::string path = scratch() + "/three.jvw";

@@ -190,23 +190,6 @@ TEST(HaarScaling, RoundedAreasCorrectTheWeightAndOnlyKnownKindsCopy)
     EXPECT_EQ(empty.Eval(img.image, 0.25f, 0), 0.0f);
 }
 
-TEST(FeaturePoolShapes, FirstIsTheDeviationFeatureAndTheRestStayInsideTheWindow)
-{
-    Pool pool(20, 16, 2, 2, 0.25f, 1.25f);
-    ASSERT_GT(pool.count, 1);
-    EXPECT_EQ(pool.features[0].kind, WindowFeature::DEVIATION);
-    for (int i = 1; i < pool.count; ++i) {
-        WindowFeature const& f = pool.features[i];
-        ASSERT_EQ(f.kind, WindowFeature::HAAR);
-        ASSERT_TRUE(f.haar->count == 2 || f.haar->count == 4);
-        for (int r = 0; r < f.haar->count; ++r) {
-            HaarRect const& rect = f.haar->rects[r];
-            ASSERT_TRUE(0 <= rect.left && rect.left < rect.right && rect.right <= 20) << i;
-            ASSERT_TRUE(0 <= rect.top && rect.top < rect.bottom && rect.bottom <= 16) << i;
-        }
-    }
-}
-
 TEST(ScaleFeatures, WalkGivesTheFeaturesOwnValuesBitForBit)
 {
     // Rectangle counts around the straight-line cases 2 and 4, the

@@ -67,18 +67,7 @@ TEST(ILabsClassifier, ScoresTheQuadraticFormAndPassesStrictlyAboveZero)
         EXPECT_THROW(c.classify(category, kFeature, 3), qv_invalid_argument) << category;
 }
 
-TEST(ILabsClassifierLoad, EveryTruncationIsADataErrorAndLeavesNoCategories)
-{
-    std::vector<uint8_t> full = postfilterwriters::ilabsModelPayload(std::vector<IlabsCategory>(15, handCategory()));
-    for (std::size_t n = 0; n < full.size(); n += (n < 120 ? 1 : 37)) {
-        ScopedModel model("pf_ilabs_cut", std::vector<uint8_t>(full.begin(), full.begin() + n));
-        ILabsClassifier classifier;
-        EXPECT_THROW(classifier.init("pf_ilabs_cut"), qv_data_error) << "cut at " << n;
-        EXPECT_EQ(classifier.categoryCount(), 0);
-    }
-    EXPECT_THROW(ILabsClassifier().init("pf_no_such_model"), qv_data_error);
-}
-
+// Cut models are left to FuzzPostFilterModel and its replayed regressions.
 TEST(ILabsClassifierLoad, RejectsCountsOutOfRange)
 {
     // A category whose blocks claim `counts` but store `stored` values; "" for

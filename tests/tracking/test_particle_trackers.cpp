@@ -251,33 +251,6 @@ TEST_F(FaceScene, CascadeTrackerOpensAFacePerUnmatchedDetection)
     EXPECT_EQ(t.cascades.alive, std::vector<bool>({true, false, false}));
 }
 
-TEST_F(FaceScene, CascadeFilterCopiesAndMovesPointAtTheirOwnObservers)
-{
-    auto pointsHome = [](const CascadePF& c) {
-        return c.filters.size() == 2 && c.filters[0].getObserver() == &c.ldaObserver &&
-               c.filters[1].getObserver() == &c.boostObserver;
-    };
-    QVArrayList<CascadePF> list;
-    {
-        CascadePF local;
-        local.init(*cascade);
-        EXPECT_EQ(local.predict(image, nullptr), 0) << "not trained yet";
-        local.update(image, truth);
-        // Enough inserts to make the vector move its elements more than once.
-        for (int i = 0; i < 9; ++i) list.insert(local);
-    } // the original is gone: any filter still pointing into it would be caught here
-    for (const CascadePF& c : list.items) EXPECT_TRUE(pointsHome(c));
-    CascadePF moved(std::move(list.items[3])), assigned, moveAssigned;
-    assigned = list.items[4];
-    moveAssigned = std::move(list.items[5]);
-    for (CascadePF* c : {&moved, &assigned, &moveAssigned}) {
-        EXPECT_TRUE(pointsHome(*c));
-        DetectionWindow w{};
-        ASSERT_EQ(c->predict(image, &w), 1);
-        EXPECT_GE(w.Overlap(truth), 0.5f);
-    }
-}
-
 TEST_F(FaceScene, CascadeFilterSeedsKeepOnlyShiftsInsideTheImage)
 {
     struct Case {
