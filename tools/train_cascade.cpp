@@ -40,6 +40,12 @@
 //       the face-free report images, found in modes 0 and 2.
 //   train_cascade raw-hits --image P [--side S] [--step F] [--mode M]
 //       A photo's raw cascade hits (category, score, window) and the entry's boxes.
+//   train_cascade pose-boxes --pose DIR --out TSV [--boxes TSV --five TSV] [--jsonl FILE]
+//       Head-pose photos (and many-identity photos of turned heads) as face
+//       rows with their yaw, in the engine's framing; --jsonl also writes
+//       them as dump_hits labels. Report people: --report-people (3,6,9,12).
+//   train_cascade pose-measure --pose-boxes TSV [--modes 2,0]
+//       Faces found by yaw on the head-pose report people.
 //   train_cascade roll-measure --boxes TSV [--limit N] [--angles A,...] [--modes M,...]
 //       Faces found and mean roll error on report photos turned about the face
 //       centre, through quorin_detect.
@@ -50,6 +56,7 @@
 // line (tab separated). Deterministic for a given --seed.
 
 #include <algorithm>
+#include <array>
 #include <atomic>
 #include <chrono>
 #include <cmath>
@@ -62,6 +69,7 @@
 #include <map>
 #include <memory>
 #include <random>
+#include <set>
 #include <sstream>
 #include <string>
 #include <thread>
@@ -504,6 +512,7 @@ struct FaceRow {
     std::string path, identity, split, source;
     Box box;
     double roll = 0; // of the labelled eye line, degrees
+    double yaw = 0;  // head-pose rows: < 0 when the nose points to the image's right
 };
 
 // Keeps `count` rows spread evenly over the list (all when there are fewer).
@@ -536,6 +545,8 @@ std::vector<FaceRow> readBoxes(std::string const& path)
             continue;
         if (!(ls >> r.roll))
             r.roll = 0;
+        if (!(ls >> r.yaw))
+            r.yaw = 0;
         rows.push_back(r);
     }
     return rows;
@@ -649,6 +660,9 @@ struct Miner {
     // the branches should find is mined as a negative.
     std::vector<double> faceRolls;
     double minQuarterRoll = 0;
+    // Per face photo: its face is the only one (the head-pose photos), so a
+    // hit away from it is a negative too.
+    std::vector<char> soleFace;
     std::string modelName = "cascade_in_training";
     // Which hits to keep and how: -1 drops it, 0 cuts it as it is, 1 mirrored
     // (a branch learns from its mirror branch's hits too). Unset keeps all.
@@ -733,7 +747,9 @@ struct Miner {
                             const Box hit{(w.left + w.right) / 2.0, (w.top + w.bottom) / 2.0,
                                           static_cast<double>(w.right - w.left)};
                             const double overlap = iou(hit, face);
-                            if (overlap <= 0.0 || (v.quarters == 0 && overlap >= 0.4))
+                            const size_t f = v.image - images.size();
+                            const bool sole = f < soleFace.size() && soleFace[f] != 0;
+                            if ((overlap <= 0.0 && !sole) || (v.quarters == 0 && overlap >= 0.4))
                                 continue;
                         }
                         const int how = pick ? pick(hits[k]) : 0;
@@ -1302,7 +1318,7 @@ Gray rotatedAbout(Gray const& in, double cx, double cy, double degrees)
 // the upright positives are. `mirrorOut`, if given, gets every patch mirrored
 // (the same face with the opposite roll).
 void turnedSamples(std::vector<FaceRow> const& rows, TrainConfig const& cfg, double lo, double hi, uint64_t seed,
-                   SampleSet& out, SampleSet* mirrorOut)
+                   SampleSet& out, SampleSet* mirrorOut, bool mirrorByYaw = false)
 {
     std::mt19937_64 rng(seed);
     std::uniform_real_distribution<double> u(-1.0, 1.0), roll(lo, hi);
@@ -1313,9 +1329,10 @@ void turnedSamples(std::vector<FaceRow> const& rows, TrainConfig const& cfg, dou
             continue;
         for (int c = 0; c < cfg.copies; ++c) {
             // a mirrored copy turned the other way has the same roll
-            const bool mirror = c % 2 == 1;
+            // (heads turned sideways: mirrored so that the nose points to the image's right)
+            const bool mirror = mirrorByYaw ? r.yaw > 0 : c % 2 == 1;
             const double theta = roll(rng);
-            const Gray g = rotatedAbout(photo, r.box.cx, r.box.cy, mirror ? -theta : theta);
+            const Gray g = rotatedAbout(photo, r.box.cx, r.box.cy, mirror && !mirrorByYaw ? -theta : theta);
             IN_IMAGE image;
             if (!image.Init(g.width, g.height, g.width, g.pixels.data()))
                 continue;
@@ -1370,6 +1387,110 @@ void rollPositives(std::vector<FaceRow> const& train, TrainConfig const& cfg, do
     turnedSamples(train, cfg, bandLo, bandHi, seed + 1, right, &left);
 }
 
+// Band 2's positives: the head-pose and many-identity training rows turned
+// sideways within --yaw-band (default 25:90), the nose to the image's right
+// (mirrored where it points left), within +-10 degrees of roll; and those
+// mirrored. None without --pose-boxes.
+void sidePositives(std::map<std::string, std::string> const& a, uint64_t seed, SampleSet& right, SampleSet& left,
+                   std::vector<FaceRow>* rowsOut = nullptr)
+{
+    if (get(a, "--pose-boxes").empty())
+        return;
+    double lo = 25, hi = 90;
+    std::sscanf(get(a, "--yaw-band", "25:90").c_str(), "%lf:%lf", &lo, &hi);
+    std::vector<FaceRow> rows;
+    for (FaceRow const& r : readBoxes(get(a, "--pose-boxes")))
+        if (r.split == "train" && std::fabs(r.yaw) >= lo && std::fabs(r.yaw) <= hi)
+            rows.push_back(r);
+    TrainConfig cfg;
+    cfg.copies = std::atoi(get(a, "--yaw-copies", "4").c_str());
+    turnedSamples(rows, cfg, -10, 10, seed, right, &left, true);
+    if (rowsOut != nullptr)
+        *rowsOut = rows;
+}
+
+// Category c's branch in JointCascade::branch, and whether its faces are
+// mirrored into it (band b's two categories 2b-1 and 2b share branch b).
+size_t branchOf(int c, bool* mirrored)
+{
+    *mirrored = c > 0 && c % 2 == 0;
+    return c == 0 ? 0 : static_cast<size_t>((c + 1) / 2);
+}
+
+// Adds band 2 (heads turned sideways) to a trained one-band cascade: tables
+// for its two categories on every common stage's stumps, stage by stage,
+// against windows mined with the earlier stages where only band 2 is alive.
+void extendSide(JointCascade& jc, Miner& miner, TrainConfig const& cfg, SampleSet const& right, SampleSet const& left,
+                double hitRate, std::function<void(std::string const&)> const& say)
+{
+    JointCascade done = jc; // the stages extended so far, band 2 alive alone (for mining)
+    done.bands = 2;
+    done.common.clear();
+    done.branch.clear();
+    auto sideSums = [](std::vector<JointStage> const& stages, const uint32_t* ii, float inv, float* F, bool* alive) {
+        F[0] = F[1] = 0.0f;
+        alive[0] = alive[1] = inv < kGateInverseDeviation;
+        for (JointStage const& s : stages) {
+            for (JointStump const& st : s.stumps) {
+                const size_t b = static_cast<size_t>(JointStump::binOf(st.feature.eval(ii, inv), st.t));
+                F[0] += st.out[3][b];
+                F[1] += st.out[4][b];
+            }
+            alive[0] = alive[0] && F[0] >= s.thresholds[3];
+            alive[1] = alive[1] && F[1] >= s.thresholds[4];
+        }
+    };
+    for (size_t k = 0; k < jc.common.size(); ++k) {
+        SampleSet neg;
+        size_t searched = 0;
+        miner.pick = nullptr;
+        miner.faceShare = k == 0 ? 0 : 30;
+        const size_t variants = miner.mine(CascadeWriter::toBytes(done.toModel()), static_cast<size_t>(cfg.negatives),
+                                           cfg.seed * 1000003u + 500 + k, cfg.threads, neg, &searched);
+        std::vector<JointStage> const& prior = done.common;
+        SampleSet pos[2];
+        float F[2];
+        bool ok[2];
+        SampleSet const* sets[2] = {&right, &left};
+        for (size_t c = 0; c < 2; ++c)
+            for (size_t i = 0; i < sets[c]->size(); ++i) {
+                sideSums(prior, sets[c]->integral(i), sets[c]->inverseDeviation(i), F, ok);
+                if (ok[c])
+                    pos[c].addFrom(*sets[c], i);
+            }
+        std::vector<std::vector<char>> alive(2, std::vector<char>(neg.size(), 0));
+        for (size_t i = 0; i < neg.size(); ++i) {
+            sideSums(prior, neg.integral(i), neg.inverseDeviation(i), F, ok);
+            alive[0][i] = ok[0];
+            alive[1][i] = ok[1];
+        }
+        JointStage st = jc.common[k];
+        JointReport rep;
+        extendSoftStage(
+            st, {&pos[0], &pos[1]}, neg,
+            [&prior, &sideSums](const uint32_t* ii, float inv, float* sums) {
+                bool al[2];
+                sideSums(prior, ii, inv, sums, al);
+            },
+            alive, hitRate, &rep);
+        // mining sees band 2 alone: the other categories can never pass
+        JointStage mined = st;
+        for (size_t c = 0; c < 3; ++c)
+            mined.thresholds[c] = 1e30f;
+        done.common.push_back(mined);
+        jc.common[k] = st;
+        char line[200];
+        std::snprintf(line, sizeof line,
+                      "side band, common stage %zu: positives %zu / %zu, %zu negatives from %zu variants; hit %.4f / "
+                      "%.4f, background passing %.4f",
+                      k, pos[0].size(), pos[1].size(), neg.size(), variants, rep.hitRate[0], rep.hitRate[1],
+                      rep.falseRate);
+        say(line);
+    }
+    jc.bands = 2;
+    jc.branch.resize(3);
+}
+
 int commandJointTrain(std::map<std::string, std::string> const& a)
 {
     TrainConfig cfg;
@@ -1403,9 +1524,10 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
     };
     JointCascade jc;
     if (jc.load(work + "/joint.txt"))
-        say("resuming: %zu common stages, branch stages %zu / %zu", jc.common.size(),
-            jc.branch.size() > 0 ? jc.branch[0].size() : size_t{0}, jc.branch.size() > 1 ? jc.branch[1].size() : size_t{0});
-    jc.branch.resize(2);
+        say("resuming: %d bands, %zu common stages, branch stages %zu / %zu / %zu", jc.bands, jc.common.size(),
+            jc.branch.size() > 0 ? jc.branch[0].size() : size_t{0}, jc.branch.size() > 1 ? jc.branch[1].size() : size_t{0},
+            jc.branch.size() > 2 ? jc.branch[2].size() : size_t{0});
+    jc.branch.resize(static_cast<size_t>(1 + jc.bands));
     const std::vector<FaceRow> train = rollTrainFaces(a);
     Miner miner;
     miner.minQuarterRoll = std::atof(get(a, "--min-quarter-roll", "0").c_str());
@@ -1429,12 +1551,33 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
             }
         }
     }
-    SampleSet upright, right, left;
+    SampleSet upright, right, left, sideRight, sideLeft;
     rollPositives(train, cfg, uprightRoll, bandLo, bandHi, cfg.seed, upright, right, left);
-    say("%zu faces; positives: upright %zu, turned %zu + %zu mirrored; %zu face-free images, %zu turned face photos",
-        train.size(), upright.size(), right.size(), left.size(), miner.images.size(), miner.facePhotos.size());
+    std::vector<FaceRow> sideRows;
+    sidePositives(a, cfg.seed + 3, sideRight, sideLeft, &sideRows);
+    miner.soleFace.assign(miner.facePhotos.size(), 0);
+    for (FaceRow const& r : sideRows) {
+        // sideways heads framed wrongly are hard negatives of their branch, and
+        // on the head-pose photos (one person before a plain wall) so is every
+        // other hit: hair, ears, collars
+        Gray g;
+        if (loadGray(r.path, g)) {
+            miner.facePhotos.push_back(std::move(g));
+            miner.faceBoxes.push_back(r.box);
+            miner.faceRolls.push_back(0);
+            miner.soleFace.push_back(r.source == "pointing04");
+        }
+    }
+    say("%zu faces; positives: upright %zu, turned %zu + %zu mirrored, sideways %zu + %zu mirrored; %zu face-free "
+        "images, %zu face photos",
+        train.size(), upright.size(), right.size(), left.size(), sideRight.size(), sideLeft.size(),
+        miner.images.size(), miner.facePhotos.size());
     FeaturePool pool(2, 2, 0.25f, 1.25f);
-    const std::vector<SampleSet const*> positives{&upright, &right, &left};
+    std::vector<SampleSet const*> positives{&upright, &right, &left};
+    if (jc.bands > 1 || !sideRows.empty()) {
+        positives.push_back(&sideRight);
+        positives.push_back(&sideLeft);
+    }
     const size_t K = 3;
     auto save = [&] {
         jc.save(work + "/joint.txt");
@@ -1494,6 +1637,29 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
     }
     if (static_cast<int>(jc.common.size()) < commonStages)
         return 0;
+    if (jc.bands == 1 && !sideRows.empty()) {
+        extendSide(jc, miner, cfg, sideRight, sideLeft, std::atof(get(a, "--side-hit-rate", "0.99").c_str()),
+                   [&](std::string const& line) { say("%s", line.c_str()); });
+        // the side band takes at most --side-routing of the faces the other categories would get
+        std::vector<float> need;
+        float F[15];
+        bool ok[15];
+        for (size_t c = 0; c < K; ++c)
+            for (size_t i = 0; i < positives[c]->size(); ++i) {
+                jc.commonSums(positives[c]->integral(i), positives[c]->inverseDeviation(i), F, ok);
+                float mine = -1e30f, side = -1e30f;
+                for (int k = 0; k < jc.categories(); ++k)
+                    if (ok[k])
+                        (k < 3 ? mine : side) = std::max(k < 3 ? mine : side, jc.margin(k, F[k]));
+                if (mine > -1e30f)
+                    need.push_back(side > -1e30f ? std::max(0.0f, side - mine) : 0.0f);
+            }
+        std::sort(need.begin(), need.end());
+        const double share = std::atof(get(a, "--side-routing", "0.99").c_str());
+        if (!need.empty())
+            jc.sideBias = need[std::min(need.size() - 1, static_cast<size_t>(share * need.size()))] + 1e-3f;
+        save();
+    }
     if (jc.uprightBias == 0.0f) {
         // the bias that sends the asked share of the upright faces upright
         std::vector<float> need;
@@ -1514,19 +1680,20 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
             jc.uprightBias = need[std::min(need.size() - 1, static_cast<size_t>(uprightRouting * need.size()))] + 1e-3f;
         save();
     }
-    for (size_t c = 0; c < K; ++c) {
-        size_t counts[3] = {0, 0, 0}, dropped = 0;
+    for (size_t c = 0; c < positives.size(); ++c) {
+        size_t counts[5] = {0, 0, 0, 0, 0}, dropped = 0;
         for (size_t i = 0; i < positives[c]->size(); ++i) {
             bool passes = false;
             const int route = jc.route(positives[c]->integral(i), positives[c]->inverseDeviation(i), &passes);
-            passes ? ++counts[route] : ++dropped;
+            passes ? ++counts[std::min(route, 4)] : ++dropped;
         }
-        say("category %zu positives (upright bias %.3f): routed upright %zu, right %zu, left %zu, rejected %zu", c,
-            static_cast<double>(jc.uprightBias), counts[0], counts[1], counts[2], dropped);
+        say("category %zu positives (biases %.3f, %.3f): routed %zu / %zu / %zu / %zu / %zu, rejected %zu", c,
+            static_cast<double>(jc.uprightBias), static_cast<double>(jc.sideBias), counts[0], counts[1], counts[2],
+            counts[3], counts[4], dropped);
     }
     // the branches, a stage of each in turn
     for (int k = 0; k < branchStages && !timeUp(); ++k)
-        for (size_t b = 0; b < 2 && !timeUp(); ++b) {
+        for (size_t b = 0; b < jc.branch.size() && !timeUp(); ++b) {
             if (static_cast<int>(jc.branch[b].size()) > k || trainBranches.find(std::to_string(b)) == std::string::npos)
                 continue;
             // every face the common stages send to this branch is its positive,
@@ -1538,10 +1705,13 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
                     const int route = jc.route(p->integral(i), p->inverseDeviation(i), &passes);
                     if (!passes)
                         continue;
-                    if (route == static_cast<int>(b)) {
+                    bool mirrored = false;
+                    if (branchOf(route, &mirrored) != b)
+                        continue;
+                    if (!mirrored) {
                         if (jc.branchPasses(b, p->integral(i), p->inverseDeviation(i)))
                             pos.addFrom(*p, i);
-                    } else if (b == 1 && route == 2) {
+                    } else {
                         flipped.clear();
                         addMirrored(*p, i, flipped);
                         if (jc.branchPasses(b, flipped.integral(0), flipped.inverseDeviation(0)))
@@ -1550,9 +1720,10 @@ int commandJointTrain(std::map<std::string, std::string> const& a)
                 }
             miner.faceShare = faceShare;
             miner.pick = [b](ScoredWindow const& w) {
-                if (w.category == static_cast<int>(b))
-                    return 0;
-                return b == 1 && w.category == 2 ? 1 : -1;
+                bool mirrored = false;
+                if (branchOf(w.category, &mirrored) != b)
+                    return -1;
+                return mirrored ? 1 : 0;
             };
             size_t searched = 0;
             const size_t variants = miner.mine(CascadeWriter::toBytes(jc.toModel()), static_cast<size_t>(cfg.negatives),
@@ -1605,6 +1776,8 @@ int commandJointModel(std::map<std::string, std::string> const& a)
             b.resize(static_cast<size_t>(stages));
     if (!get(a, "--bias").empty())
         jc.uprightBias = std::strtof(get(a, "--bias").c_str(), nullptr);
+    if (!get(a, "--side-bias").empty())
+        jc.sideBias = std::strtof(get(a, "--side-bias").c_str(), nullptr);
     // --raise K:D,...: common stage K's thresholds raised by D for every
     // category, trading a little recall for fewer features per window
     std::istringstream raise(get(a, "--raise"));
@@ -1626,11 +1799,19 @@ int commandJointModel(std::map<std::string, std::string> const& a)
         TrainConfig cfg;
         SampleSet upright, right, left;
         rollPositives(rollTrainFaces(a), cfg, 10, 12, 50, 977, upright, right, left);
+        SampleSet sideRight, sideLeft;
+        std::vector<SampleSet const*> positives{&upright, &right, &left};
+        if (jc.bands > 1) {
+            // band 2's positives (--pose-boxes) or none: then no early rejections there
+            sidePositives(a, 980, sideRight, sideLeft);
+            positives.push_back(&sideRight);
+            positives.push_back(&sideLeft);
+        }
         std::vector<double> quantiles;
         std::istringstream qs(get(a, "--trace"));
         for (std::string item; std::getline(qs, item, ',');)
             quantiles.push_back(std::atof(item.c_str()));
-        jc.traceCommon({&upright, &right, &left}, quantiles);
+        jc.traceCommon(positives, quantiles);
     }
     CascadeModel m = jc.toModel();
     // --upright-cascade STATE: the frontal cascade finishes the upright
@@ -1740,6 +1921,182 @@ int commandRollMeasure(std::map<std::string, std::string> const& a)
     return 0;
 }
 
+// ------------------------------------------------------------------ faces turned sideways
+
+// Head-pose photos (labels.tsv: file, yaw, pitch, box x, y, w, h, person, ...)
+// and the many-identity photos whose five points show a turned head, as face
+// rows in the engine's framing. The pose boxes cover the visible face from
+// brows to chin; the engine's square follows from the box's height and centre
+// by a mapping fitted where the built-in cascade finds the near-frontal faces.
+int commandPoseBoxes(std::map<std::string, std::string> const& a)
+{
+    const std::string dir = get(a, "--pose");
+    struct PoseLabel {
+        std::string path;
+        double yaw, pitch, x, y, w, h;
+        int person;
+    };
+    std::vector<PoseLabel> labels;
+    {
+        std::ifstream in(dir + "/labels.tsv");
+        std::string line;
+        std::getline(in, line);
+        while (std::getline(in, line)) {
+            std::istringstream ls(line);
+            PoseLabel l;
+            std::getline(ls, l.path, '\t');
+            if (ls >> l.yaw >> l.pitch >> l.x >> l.y >> l.w >> l.h >> l.person)
+                labels.push_back({dir + "/" + l.path, l.yaw, l.pitch, l.x, l.y, l.w, l.h, l.person});
+        }
+    }
+    if (labels.empty()) {
+        std::cerr << "no labels in " << dir << "/labels.tsv\n";
+        return 1;
+    }
+    CascadeDetector cascade(R"({"model":"mdcb","imageMaxSize":640,"faceMinSize":32,"faceMaxSize":640})");
+    std::vector<double> scale, dx, dy;
+    for (PoseLabel const& l : labels) {
+        if (std::fabs(l.yaw) > 15 || std::fabs(l.pitch) > 15)
+            continue;
+        Gray g;
+        if (!loadGray(l.path, g))
+            continue;
+        for (Box const& b : builtinBoxes(cascade, g))
+            if (b.cx > l.x && b.cx < l.x + l.w && b.cy > l.y && b.cy < l.y + l.h) {
+                scale.push_back(b.side / l.h);
+                dx.push_back((b.cx - l.x - l.w / 2) / l.h);
+                dy.push_back((b.cy - l.y - l.h / 2) / l.h);
+            }
+    }
+    if (scale.size() < 20) {
+        std::cerr << "the built-in cascade found only " << scale.size() << " near-frontal pose faces\n";
+        return 1;
+    }
+    auto median = [](std::vector<double> v) {
+        std::nth_element(v.begin(), v.begin() + static_cast<std::ptrdiff_t>(v.size() / 2), v.end());
+        return v[v.size() / 2];
+    };
+    const double k = median(scale), oy = median(dy);
+    std::fprintf(stderr, "pose-boxes: %zu near-frontal faces: side %.3f x box height, centre %+.3f / %+.3f box heights\n",
+                 scale.size(), k, median(dx), oy);
+    // people split by person: every third for the report
+    std::set<int> reportPeople;
+    std::istringstream rp(get(a, "--report-people", "3,6,9,12"));
+    for (std::string item; std::getline(rp, item, ',');)
+        reportPeople.insert(std::atoi(item.c_str()));
+    std::ofstream o(get(a, "--out"));
+    o << "# path\tidentity\tsplit\tsource\tcx\tcy\tside\troll\tyaw\n";
+    if (!get(a, "--jsonl").empty()) {
+        // the same boxes as dump_hits' labels, for a data folder whose
+        // photos/pointing04 is the pose photos' images folder
+        std::ofstream j(get(a, "--jsonl"));
+        for (PoseLabel const& l : labels) {
+            const double cx = l.x + l.w / 2, cy = l.y + l.h / 2 + oy * l.h, half = k * l.h / 2;
+            j << R"({"image":"photos/pointing04/)" << l.path.substr(l.path.rfind('/') + 1) << R"(","faces":[{"rect":[)"
+              << cx - half << ',' << cy - half << ',' << cx + half << ',' << cy + half << "]}]}\n";
+        }
+    }
+    for (PoseLabel const& l : labels)
+        o << l.path << "\tpointing04/person" << l.person << '\t' << (reportPeople.count(l.person) ? "report" : "train")
+          << "\tpointing04\t" << l.x + l.w / 2 << '\t' << l.y + l.h / 2 + oy * l.h << '\t' << k * l.h << "\t0\t" << l.yaw
+          << '\n';
+    // turned heads among the many-identity photos with human points: the nose
+    // off the eyes' midpoint along the eye line, in eye distances
+    size_t turnedRows = 0;
+    if (!get(a, "--boxes").empty()) {
+        std::map<std::string, double> offset;
+        std::ifstream five(get(a, "--five"));
+        std::string line;
+        std::getline(five, line);
+        while (std::getline(five, line)) {
+            std::istringstream ls(line);
+            std::string file;
+            double p[6];
+            std::getline(ls, file, '\t');
+            if (!(ls >> p[0] >> p[1] >> p[2] >> p[3] >> p[4] >> p[5]))
+                continue;
+            const double ex = p[2] - p[0], ey = p[3] - p[1], d = std::hypot(ex, ey);
+            if (d > 1)
+                offset[file] = ((p[4] - (p[0] + p[2]) / 2) * ex + (p[5] - (p[1] + p[3]) / 2) * ey) / (d * d);
+        }
+        const double least = std::atof(get(a, "--min-offset", "0.25").c_str());
+        for (FaceRow const& r : readBoxes(get(a, "--boxes"))) {
+            const size_t at = r.path.rfind("photos/");
+            auto it = offset.find(at == std::string::npos ? r.path : r.path.substr(at + 7));
+            if (it == offset.end() || std::fabs(it->second) < least)
+                continue;
+            // about 35 degrees at the least offset; the sign as the pose photos'
+            const double yaw = -std::copysign(std::min(90.0, 35.0 * std::fabs(it->second) / least), it->second);
+            o << r.path << '\t' << r.identity << '\t' << r.split << '\t' << r.source << "-turned\t" << r.box.cx << '\t'
+              << r.box.cy << '\t' << r.box.side << '\t' << r.roll << '\t' << yaw << '\n';
+            ++turnedRows;
+        }
+    }
+    std::fprintf(stderr, "pose-boxes: %zu head-pose rows, %zu turned many-identity rows\n", labels.size(), turnedRows);
+    return 0;
+}
+
+// Faces found by yaw on the head-pose report people through quorin_detect:
+// a face is found when a box's centre lies inside the labelled box at a side
+// within half to twice the framing's. Also the roll of found turned heads and
+// whether the five points lie inside the reported box.
+int commandPoseMeasure(std::map<std::string, std::string> const& a)
+{
+    Served served;
+    if (!served.serve(a))
+        return 1;
+    std::vector<FaceRow> rows;
+    const std::string split = get(a, "--split", "report");
+    for (FaceRow const& r : readBoxes(get(a, "--pose-boxes")))
+        if (r.source == "pointing04" && r.split == split)
+            rows.push_back(r);
+    std::istringstream ms(get(a, "--modes", "2,0"));
+    for (std::string item; std::getline(ms, item, ',');) {
+        const int mode = std::atoi(item.c_str());
+        quorin_init();
+        quorin_setDetectionMode(static_cast<unsigned>(mode));
+        std::map<int, std::array<double, 6>> byYaw; // tried, found, other boxes, |roll|, points inside, abs yaw
+        for (FaceRow const& r : rows) {
+            Gray g;
+            if (!loadGray(r.path, g))
+                continue;
+            std::vector<int> blocks(100 * kBlock, 0);
+            const int n = std::clamp(quorin_detect(g.pixels.data(), g.width, g.height, blocks.data(), 100, 0), 0, 100);
+            std::array<double, 6>& e = byYaw[static_cast<int>(std::lround(std::fabs(r.yaw)))];
+            e[0] += 1;
+            bool found = false;
+            for (int k = 0; k < n; ++k) {
+                const int* b = &blocks[static_cast<size_t>(k) * kBlock];
+                const double cx = (b[5] + b[6]) / 2.0, cy = (b[3] + b[4]) / 2.0, side = b[6] - b[5];
+                const double half = r.box.side / 2; // the labelled box is about the framing's size
+                const bool match = !found && std::fabs(cx - r.box.cx) < half && std::fabs(cy - r.box.cy) < half &&
+                                   side > 0.5 * r.box.side && side < 2 * r.box.side;
+                if (!match) {
+                    e[2] += 1;
+                    continue;
+                }
+                found = true;
+                e[1] += 1;
+                e[3] += std::abs(b[0]);
+                bool inside = true;
+                for (int p = 0; p < 5; ++p)
+                    inside = inside && b[7 + 2 * p] >= b[5] && b[7 + 2 * p] <= b[6] && b[8 + 2 * p] >= b[3] &&
+                             b[8 + 2 * p] <= b[4];
+                e[4] += inside;
+            }
+            if (!found && std::getenv("MEASURE_VERBOSE") != nullptr)
+                std::printf("  missed %s (yaw %.0f)\n", r.path.c_str(), r.yaw);
+        }
+        for (auto const& [yaw, e] : byYaw)
+            std::printf("mode %d, yaw %2d: found %3.0f / %3.0f (%5.1f%%), other boxes %3.0f, mean |roll| %.1f, points inside %.0f%%\n",
+                        mode, yaw, e[1], e[0], 100.0 * e[1] / std::max(1.0, e[0]), e[2],
+                        e[1] > 0 ? e[3] / e[1] : 0.0, e[1] > 0 ? 100.0 * e[4] / e[1] : 0.0);
+        std::fflush(stdout);
+        quorin_release();
+    }
+    return 0;
+}
+
 const char* kUsage = "usage: train_cascade boxes|train|measure|model|joint-train|joint-model|roll-measure [--key value ...] (see the comment at the top)\n";
 
 } // namespace
@@ -1809,6 +2166,10 @@ int main(int argc, char** argv)
         return commandRawHits(a);
     if (cmd == "pasted")
         return commandPasted(a);
+    if (cmd == "pose-boxes")
+        return commandPoseBoxes(a);
+    if (cmd == "pose-measure")
+        return commandPoseMeasure(a);
     std::cerr << kUsage;
     return 2;
 }

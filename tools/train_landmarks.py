@@ -24,6 +24,7 @@ import hashlib
 import json
 import math
 import os
+import re
 import sys
 import time
 
@@ -167,7 +168,7 @@ def plain_hits(data):
     """Merged hits on unturned, unmirrored frames, one per image and box."""
     seen, out = set(), []
     for line in open(os.path.join(data, 'labels', 'hits.tsv')):
-        img, variant, long_side, best, _score, l, t, r, b = line.rstrip('\n').split('\t')
+        img, variant, long_side, best, _score, l, t, r, b = line.rstrip('\n').split('\t')[:9]
         if variant != '-' or float(best) < 0.4:
             continue
         key = (img, l, t, r, b)
@@ -224,6 +225,61 @@ def load_face_samples(faces_dir, human, sources):
                             'split': 'report' if report_person(who) else 'train', 'who': who,
                             'human': is_human, 'central': k == central, 'source': img.split('/')[1]})
     return samples, (np.mean(offsets, 0) if offsets else np.zeros(10))
+
+
+# The five points of a frontal upright face in our box (units of its side, from
+# its centre; the mean of the human-labelled near-frontal training faces, made
+# symmetric), and their depth in front of the head's vertical axis.
+FRONTAL = np.array([[-0.186, -0.103], [0.186, -0.103], [0.0, 0.112], [-0.163, 0.29], [0.163, 0.29]])
+DEPTH = np.array([0.30, 0.30, 0.45, 0.28, 0.28])
+# The visible face's outline (cheeks, brow, chin, nose) as (x, y, depth), which
+# the head-pose boxes frame.
+OUTLINE = np.array([[-0.38, 0.1, 0.0], [0.38, 0.1, 0.0], [0.0, -0.25, 0.25], [0.0, 0.45, 0.2], [0.0, 0.112, 0.45]])
+
+
+def pose_points(yaw, pitch):
+    """Best-guess five points of a head turned by yaw (< 0: the nose to the
+    image's right) and pitch (< 0: looking down), in units of the box side from
+    the centre of the box that frames its visible face: the frontal points
+    turned about the head's axes, hidden ones included, recentred as the box
+    follows the visible outline. The eyes stay level, so the roll is 0."""
+    a, b = math.radians(-yaw), math.radians(-pitch)
+
+    def turn(x, y, z):
+        x2 = x * math.cos(a) + z * math.sin(a)
+        z2 = -x * math.sin(a) + z * math.cos(a)
+        return x2, y * math.cos(b) + z2 * math.sin(b)
+
+    pts = np.array([turn(x, y, z) for (x, y), z in zip(FRONTAL, DEPTH)])
+    # the hidden eye and mouth corner kept a little toward the nose, so the
+    # eye line (the reported roll) stays defined on a full profile
+    far = 1 if yaw < 0 else 0
+    for pair, least in (((0, 1), 0.15), ((3, 4), 0.1)):
+        near = pair[1 - far]
+        gap = pts[pair[1], 0] - pts[pair[0], 0]
+        if gap < least:
+            pts[pair[far], 0] = pts[near, 0] + (least if far == 1 else -least)
+    out = np.array([turn(*o) for o in OUTLINE])
+    centre = (out.min(0) + out.max(0)) / 2 - (OUTLINE[:, :2].min(0) + OUTLINE[:, :2].max(0)) / 2
+    return pts - centre
+
+
+def load_pose_samples(pose_dir, report_people=(3, 6, 9, 12)):
+    """The head-pose photos (a folder made by `train_cascade pose-boxes --jsonl`)
+    with best-guess points (pose_points) in their labelled boxes, split by person."""
+    samples = []
+    for line in open(os.path.join(pose_dir, 'labels', 'faces.jsonl')):
+        e = json.loads(line)
+        name = os.path.basename(e['image'])
+        # personPPSNN, then the pitch and the yaw with their signs: person03144+0-30.jpg
+        person, pitch, yaw = (int(v) for v in re.match(r'person(\d\d)\d{3}([+-]\d+)([+-]\d+)', name).groups())
+        box = np.array(e['faces'][0]['rect'])
+        side = box[2] - box[0]
+        pts = (box[:2] + box[2:]) / 2 + pose_points(yaw, pitch) * side
+        samples.append({'root': pose_dir, 'image': e['image'], 'long': 640, 'box': box, 'pts': pts,
+                        'split': 'report' if person in report_people else 'train', 'who': 'pose:%d' % person,
+                        'human': False, 'source': 'pose', 'yaw': yaw})
+    return samples
 
 
 def move_teacher_points(samples, offset):
@@ -351,7 +407,7 @@ def train_net(model, U, Y, args, work):
 
 def run_tag(args):
     keys = ('side', 'hidden', 'draws', 'epochs', 'seed', 'decay', 'lr', 'batch', 'sources', 'spread',
-            'teacher_offset', 'limit', 'roll_range')
+            'teacher_offset', 'limit', 'roll_range', 'pose')
     return json.dumps({k: getattr(args, k) for k in keys})
 
 
@@ -380,6 +436,8 @@ def main(argv=None):
                     help='move teacher points by the mean human-minus-teacher offset (1) or not (0)')
     ap.add_argument('--limit', type=int, default=0, help='train on at most this many faces (for the data curve)')
     ap.add_argument('--report', default=None, help='write the figures as JSON to this file')
+    ap.add_argument('--pose', default=None,
+                    help='head-pose folder (train_cascade pose-boxes --jsonl): its training people join')
     ap.add_argument('--roll-range', type=float, default=0.0,
                     help='half the augmented draws turn the face uniformly within +-this many degrees '
                          '(0: all turns drawn around upright)')
@@ -391,6 +449,8 @@ def main(argv=None):
     tag = '%s-s%d-d%d-l%d-t%d' % ('+'.join(args.sources), args.side, args.draws, args.limit, args.teacher_offset)
     if args.roll_range:
         tag += '-r%g' % args.roll_range
+    if args.pose:
+        tag += '-pose'
     args.work = os.path.join(args.work, tag + '-' + '-'.join(map(str, args.hidden)))
     os.makedirs(args.work, exist_ok=True)
     torch.manual_seed(args.seed)
@@ -412,6 +472,8 @@ def main(argv=None):
         print('teacher points moved by %s (box units)' % ' '.join('%.4f' % v for v in offset))
     train = [s for s in many if s['split'] == 'train' and s['source'] in args.sources] + ([s for s in dev if s['split'] == 'train']
                                                           if 'dev' in args.sources else [])
+    pose = load_pose_samples(args.pose) if args.pose else []
+    train += [s for s in pose if s['split'] == 'train']
     if args.limit:
         # A fixed subset of people, for the curve of data size against error.
         people = sorted({s['who'] for s in train}, key=lambda p: hashlib.sha256(p.encode()).hexdigest())
@@ -475,7 +537,11 @@ def main(argv=None):
               ('report, human points, turned 30', report_human, 0, 30),
               ('report, human points, turned 45', report_human, 0, 45),
               ('report, teacher points (central faces)', report_teacher, 0),
-              ('development report split', [s for s in dev if s['split'] == 'report'], 0)]
+              ('development report split', [s for s in dev if s['split'] == 'report'], 0),
+              ('report, head-pose photos, yaw 0 to 30 (best-guess points)',
+               [s for s in pose if s['split'] == 'report' and abs(s['yaw']) <= 30], 0),
+              ('report, head-pose photos, yaw 45 to 90 (best-guess points)',
+               [s for s in pose if s['split'] == 'report' and abs(s['yaw']) >= 45], 0)]
     figures = {'args': vars(args), 'scales': scales, 'inputs_below_minus_one': low}
     print('%s: patch %dx%d, hidden %s, layer scales %s, inputs below -1: %.3f%%'
           % (tag, args.side, args.side, args.hidden, scales, 100 * low))

@@ -92,6 +92,22 @@ def load_face_hits(prefix):
     return feats.reshape(len(rows), DIM)[keep], labels, sets, [rows[i] for i in keep]
 
 
+def load_pose_hits(prefix, report_people=(3, 6, 9, 12)):
+    """Hits on the head-pose photos (dump_hits over a folder whose photos/pointing04
+    holds them, labels from `train_cascade pose-boxes --jsonl`): one labelled face per
+    photo before a plain background, so a hit is a face at IoU >= 0.4 and a false hit
+    below 0.1. Split by person as `pose-boxes` splits them."""
+    rows = [line.rstrip('\n').split('\t') for line in open(prefix + '.tsv')]
+    feats = np.fromfile(prefix + '.f32', dtype='<f4')
+    if feats.size != len(rows) * DIM:
+        raise SystemExit('%s.tsv and .f32 disagree: run dump_hits again' % prefix)
+    keep = [i for i, r in enumerate(rows) if float(r[3]) >= 0.4 or float(r[3]) < 0.1]
+    person = [int(os.path.basename(rows[i][0])[6:8]) for i in keep]
+    sets = np.array(['report' if p in report_people else 'train' for p in person])
+    labels = np.array([1 if float(rows[i][3]) >= 0.4 else 0 for i in keep], int)
+    return feats.reshape(len(rows), DIM)[keep], labels, sets, [rows[i] for i in keep]
+
+
 def fit_logistic(x, y, l2, steps=30):
     """Class-balanced L2 logistic regression by Newton steps; returns (w, b)."""
     n, d = x.shape
@@ -156,6 +172,7 @@ def main(argv=None):
     ap.add_argument('--compare', default=os.path.join(HERE, '..', 'models', 'mdpb.bin'),
                     help='payload whose figures are printed beside the new one (read before writing --out)')
     ap.add_argument('--l2', type=float, default=100.0, help='ridge weight on the standardised feature')
+    ap.add_argument('--pose', default=None, help='prefix of dump_hits output on the head-pose photos')
     ap.add_argument('--keep', type=float, default=0.999, help='share of training faces the bias keeps')
     ap.add_argument('--keep-turned', type=float, default=None,
                     help='share of training faces kept in categories 1 and up (default: --keep)')
@@ -173,6 +190,11 @@ def main(argv=None):
         feats, labels, sets, rows = (np.vstack([feats, f2]), np.concatenate([labels, l2_]),
                                      np.concatenate([sets, s2]), rows + r2)
         source = np.concatenate([source, np.array(['faces'] * len(r2), dtype=object)])
+    if args.pose:
+        f3, l3, s3, r3 = load_pose_hits(args.pose)
+        feats, labels, sets, rows = (np.vstack([feats, f3]), np.concatenate([labels, l3]),
+                                     np.concatenate([sets, s3]), rows + r3)
+        source = np.concatenate([source, np.array(['pose'] * len(r3), dtype=object)])
     before = None
     if args.compare and os.path.exists(args.compare):
         before = ilabs.read_ilabs(open(args.compare, 'rb').read())[0]
@@ -210,7 +232,8 @@ def main(argv=None):
     for name, m in (('train', sets == 'train'), ('report', sets == 'report'),
                     ('report, development data', (sets == 'report') & dev),
                     ('report, development data, plain', (sets == 'report') & dev & plain),
-                    ('report, many-identity photos', (sets == 'report') & ~dev)):
+                    ('report, many-identity photos', (sets == 'report') & (source == 'faces')),
+                    ('report, head-pose photos', (sets == 'report') & (source == 'pose'))):
         pos, neg = labels[m] == 1, labels[m] == 0
         cells = []
         for model in (quantised_all, before):

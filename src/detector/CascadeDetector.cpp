@@ -130,6 +130,11 @@ void CascadeDetector::initClassifiers(std::string const& modelPath)
     }
 
     const int branches = commonCount > 0 ? commonStages.back().scoreCount : 0;
+    // the scores kept in registers through the common stages
+    commonWidth = 3;
+    for (CascadeStage const& s : commonStages)
+        if (s.remapFlag == 0 && s.scoreCount > 3)
+            commonWidth = 5;
     branchStages.clear();
     branchStages.resize(static_cast<size_t>(branches));
     branchFeatures.clear();
@@ -302,45 +307,45 @@ namespace {
 
 // Runs `count` stages over one window, their features from `feature`, on
 // `scores`; returns the index of the stage that rejects, or -1. Most stages
-// update the first score alone, and a cascade with three categories updates
-// three: those stay in registers through them and go back to the array for
-// the others (same additions in the same order, so the same results).
+// update the first score alone, and a cascade with N categories updates N:
+// those stay in registers through them and go back to the array for the
+// others (same additions in the same order, so the same results).
+template <int N>
 int runStages(CascadeStage const* stages, int count, ScaleFeatures::Cursor feature, uint32_t const* p,
               float inverseDeviation, float* scores)
 {
-    float first = scores[0], second = scores[1], third = scores[2];
+    float r[N];
+    for (int c = 0; c < N; ++c)
+        r[c] = scores[c];
+    auto store = [&] {
+        for (int c = 0; c < N; ++c)
+            scores[c] = r[c];
+    };
     for (int i = 0; i < count; ++i, feature.next()) {
         CascadeStage const& s = stages[i];
         const float value = feature.value(p, inverseDeviation);
         bool rejected;
         if (s.singleScore()) {
-            first += s.binScores[0][s.binOf(value)];
-            rejected = first < s.rejectThreshold[0];
-        } else if (s.scoreCount == 3 && s.remapFlag == 0) {
+            r[0] += s.binScores[0][s.binOf(value)];
+            rejected = r[0] < s.rejectThreshold[0];
+        } else if (s.scoreCount == N && s.remapFlag == 0) {
             const int bin = s.binOf(value);
-            const bool dead0 = s.updateOne(first, bin, 0);
-            const bool dead1 = s.updateOne(second, bin, 1);
-            const bool dead2 = s.updateOne(third, bin, 2);
-            rejected = dead0 && dead1 && dead2;
+            int dead = 0;
+            for (int c = 0; c < N; ++c)
+                dead += s.updateOne(r[c], bin, c);
+            rejected = dead == N;
         } else {
-            scores[0] = first;
-            scores[1] = second;
-            scores[2] = third;
+            store();
             rejected = s.UpdateScoreAndThreshold(value, scores);
-            first = scores[0];
-            second = scores[1];
-            third = scores[2];
+            for (int c = 0; c < N; ++c)
+                r[c] = scores[c];
         }
         if (rejected) {
-            scores[0] = first;
-            scores[1] = second;
-            scores[2] = third;
+            store();
             return i;
         }
     }
-    scores[0] = first;
-    scores[1] = second;
-    scores[2] = third;
+    store();
     return -1;
 }
 
@@ -365,7 +370,9 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     uint32_t const* p = image.data + (window.left + image.stride * window.top);
 
     const int commonCount = static_cast<int>(commonStages.size());
-    const int rejectedAt = runStages(commonStages.data(), commonCount, features->common(), p, inverseDeviation, scores);
+    const int rejectedAt =
+        commonWidth == 5 ? runStages<5>(commonStages.data(), commonCount, features->common(), p, inverseDeviation, scores)
+                         : runStages<3>(commonStages.data(), commonCount, features->common(), p, inverseDeviation, scores);
     if (rejectedAt >= 0) {
         *score = scores[0];
         *stage = rejectedAt;
@@ -390,7 +397,7 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     scores[0] = best;
 
     std::vector<CascadeStage> const& branch = branchStages[bestIndex];
-    if (runStages(branch.data(), static_cast<int>(branch.size()), features->branch(bestIndex), p, inverseDeviation,
+    if (runStages<3>(branch.data(), static_cast<int>(branch.size()), features->branch(bestIndex), p, inverseDeviation,
                   scores) >= 0) {
         *score = scores[0];
         *stage = commonCount;

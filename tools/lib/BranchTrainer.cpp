@@ -319,6 +319,37 @@ JointStage trainSoftStage(FeaturePool const& pool, std::vector<SampleSet const*>
     return stage;
 }
 
+void extendSoftStage(JointStage& stage, std::vector<SampleSet const*> const& positives, SampleSet const& background,
+                     PriorSums const& prior, std::vector<std::vector<char>> const& alive, double hitRate,
+                     JointReport* report)
+{
+    Booster boost(positives, background, prior, alive);
+    const size_t K = positives.size();
+    for (JointStump& st : stage.stumps) {
+        const std::vector<int> b = boost.bins(st);
+        for (size_t c = 0; c < K; ++c) {
+            std::array<float, 8> table{};
+            boost.apply(c, b, &table);
+            st.out.push_back(table);
+        }
+    }
+    JointReport rep;
+    rep.hitRate.assign(K, 0.0);
+    for (size_t c = 0; c < K; ++c)
+        stage.thresholds.push_back(boost.cut(c, positives[c]->size(), hitRate, &rep.hitRate[c]));
+    size_t kept = 0;
+    for (size_t g = 0; g < background.size(); ++g) {
+        bool any = false;
+        for (size_t c = 0; c < K && !any; ++c)
+            any = (c >= alive.size() || alive[c][g]) && boost.F[c][g] >= stage.thresholds[stage.thresholds.size() - K + c];
+        kept += any;
+    }
+    rep.falseRate = static_cast<double>(kept) / std::max<size_t>(1, background.size());
+    rep.stumps = static_cast<int>(stage.stumps.size());
+    if (report != nullptr)
+        *report = rep;
+}
+
 // ------------------------------------------------------------------ the branched cascade
 
 void JointCascade::commonSums(const uint32_t* integral, float inverseDeviation, float* F, bool* alive) const
@@ -410,7 +441,7 @@ int JointCascade::route(const uint32_t* integral, float inverseDeviation, bool* 
 float JointCascade::margin(int c, float F) const
 {
     const float t = common.empty() ? 0.0f : common.back().thresholds[static_cast<size_t>(c)];
-    return F - t + (c == 0 ? uprightBias : 0.0f);
+    return F - t + (c == 0 ? uprightBias : 0.0f) - (c >= 3 ? sideBias : 0.0f);
 }
 
 float JointCascade::branchGain(size_t b) const
@@ -608,7 +639,13 @@ bool JointCascade::save(std::string const& path) const
     std::FILE* f = std::fopen(tmp.c_str(), "w");
     if (f == nullptr)
         return false;
-    std::fprintf(f, "joint-cascade 1\nbands %d\nbias %a\ncommon %zu\n", bands, static_cast<double>(uprightBias), common.size());
+    // version 2 adds band 2's bias; a one-band state keeps version 1's text
+    if (bands > 1)
+        std::fprintf(f, "joint-cascade 2\nbands %d\nbias %a\nside-bias %a\ncommon %zu\n", bands,
+                     static_cast<double>(uprightBias), static_cast<double>(sideBias), common.size());
+    else
+        std::fprintf(f, "joint-cascade 1\nbands %d\nbias %a\ncommon %zu\n", bands, static_cast<double>(uprightBias),
+                     common.size());
     for (JointStage const& s : common)
         saveJoint(f, s);
     std::fprintf(f, "branches %zu\n", branch.size());
@@ -628,13 +665,18 @@ bool JointCascade::load(std::string const& path)
     int version = 0;
     size_t count = 0;
     JointCascade c;
-    if (!(in >> word >> version) || word != "joint-cascade" || version != 1)
+    if (!(in >> word >> version) || word != "joint-cascade" || (version != 1 && version != 2))
         return false;
     if (!(in >> word >> c.bands) || word != "bands" || c.bands < 1 || c.bands > 7)
         return false;
     if (!(in >> word) || word != "bias")
         return false;
     c.uprightBias = hexFloat(in);
+    if (version == 2) {
+        if (!(in >> word) || word != "side-bias")
+            return false;
+        c.sideBias = hexFloat(in);
+    }
     if (!(in >> word >> count) || word != "common" || count > 100)
         return false;
     c.common.resize(count);

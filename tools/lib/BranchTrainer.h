@@ -68,12 +68,24 @@ JointStage trainSoftStage(FeaturePool const& pool, std::vector<SampleSet const*>
                           SampleSet const& background, PriorSums const& prior,
                           std::vector<std::vector<char>> const& alive, StageOptions const& options, JointReport* report);
 
+// Tables and thresholds for categories added to a trained stage, on its
+// stumps as they stand (their features and bin edges), by the same gentle
+// boosting from the prior sums; each new category's threshold keeps `hitRate`
+// of its positives. The stage's cost per window stays the same features.
+void extendSoftStage(JointStage& stage, std::vector<SampleSet const*> const& positives, SampleSet const& background,
+                     PriorSums const& prior, std::vector<std::vector<char>> const& alive, double hitRate,
+                     JointReport* report);
+
 // The branched cascade: common stages over all categories, then per category
 // a branch that runs its own cascade from 0 (the counter-clockwise bands are
-// the mirror images of the clockwise ones' branches).
+// the mirror images of the clockwise ones' branches). Band 1 holds heads
+// turned in the image plane; a band 2, when there is one, heads turned
+// sideways (the nose to the image's right, and its mirror image), added to
+// the trained common stages by extendSoftStage.
 struct JointCascade {
     int bands = 1;
     float uprightBias = 0.0f;
+    float sideBias = 0.0f; // taken off the margins of band 2's categories
     std::vector<JointStage> common;            // categories() thresholds each
     std::vector<std::vector<JointStage>> branch; // [0] upright, [1 + b] band b clockwise; one threshold each
     int categories() const { return 1 + 2 * bands; }
