@@ -246,15 +246,17 @@ def pose_points(yaw, pitch):
     a, b = math.radians(-yaw), math.radians(-pitch)
 
     def turn(x, y, z):
-        x2 = x * math.cos(a) + z * math.sin(a)
-        z2 = -x * math.sin(a) + z * math.cos(a)
-        return x2, y * math.cos(b) + z2 * math.sin(b)
+        # the nod about the head's own ear-to-ear axis first, then the turn
+        # about the vertical: the eyes stay level whatever the pitch
+        y1 = y * math.cos(b) + z * math.sin(b)
+        z1 = -y * math.sin(b) + z * math.cos(b)
+        return x * math.cos(a) + z1 * math.sin(a), y1
 
     pts = np.array([turn(x, y, z) for (x, y), z in zip(FRONTAL, DEPTH)])
     # the hidden eye and mouth corner kept a little toward the nose, so the
     # eye line (the reported roll) stays defined on a full profile
     far = 1 if yaw < 0 else 0
-    for pair, least in (((0, 1), 0.15), ((3, 4), 0.1)):
+    for pair, least in (((0, 1), 0.22), ((3, 4), 0.12)):
         near = pair[1 - far]
         gap = pts[pair[1], 0] - pts[pair[0], 0]
         if gap < least:
@@ -407,7 +409,7 @@ def train_net(model, U, Y, args, work):
 
 def run_tag(args):
     keys = ('side', 'hidden', 'draws', 'epochs', 'seed', 'decay', 'lr', 'batch', 'sources', 'spread',
-            'teacher_offset', 'limit', 'roll_range', 'pose')
+            'teacher_offset', 'limit', 'roll_range', 'pose', 'pose_copies')
     return json.dumps({k: getattr(args, k) for k in keys})
 
 
@@ -438,6 +440,7 @@ def main(argv=None):
     ap.add_argument('--report', default=None, help='write the figures as JSON to this file')
     ap.add_argument('--pose', default=None,
                     help='head-pose folder (train_cascade pose-boxes --jsonl): its training people join')
+    ap.add_argument('--pose-copies', type=int, default=3, help='times each head-pose training photo is drawn')
     ap.add_argument('--roll-range', type=float, default=0.0,
                     help='half the augmented draws turn the face uniformly within +-this many degrees '
                          '(0: all turns drawn around upright)')
@@ -450,7 +453,7 @@ def main(argv=None):
     if args.roll_range:
         tag += '-r%g' % args.roll_range
     if args.pose:
-        tag += '-pose'
+        tag += '-pose%d' % args.pose_copies
     args.work = os.path.join(args.work, tag + '-' + '-'.join(map(str, args.hidden)))
     os.makedirs(args.work, exist_ok=True)
     torch.manual_seed(args.seed)
@@ -473,7 +476,8 @@ def main(argv=None):
     train = [s for s in many if s['split'] == 'train' and s['source'] in args.sources] + ([s for s in dev if s['split'] == 'train']
                                                           if 'dev' in args.sources else [])
     pose = load_pose_samples(args.pose) if args.pose else []
-    train += [s for s in pose if s['split'] == 'train']
+    # a dozen people among thousands: their photos are drawn --pose-copies times
+    train += [s for s in pose if s['split'] == 'train'] * args.pose_copies
     if args.limit:
         # A fixed subset of people, for the curve of data size against error.
         people = sorted({s['who'] for s in train}, key=lambda p: hashlib.sha256(p.encode()).hexdigest())

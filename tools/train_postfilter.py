@@ -174,6 +174,9 @@ def main(argv=None):
     ap.add_argument('--l2', type=float, default=100.0, help='ridge weight on the standardised feature')
     ap.add_argument('--pose', default=None, help='prefix of dump_hits output on the head-pose photos')
     ap.add_argument('--keep', type=float, default=0.999, help='share of training faces the bias keeps')
+    ap.add_argument('--keep-side', type=float, default=None,
+                    help='share of training faces kept in categories 3 and up, heads turned sideways '
+                         '(default: --keep-turned)')
     ap.add_argument('--keep-turned', type=float, default=None,
                     help='share of training faces kept in categories 1 and up (default: --keep)')
     ap.add_argument('--categories', type=int, default=1,
@@ -207,11 +210,18 @@ def main(argv=None):
     models = []
     for k in range(args.categories):
         m = train & (cats == k)
+        if k < 3:
+            # the head-pose room (a dozen people before one wall) trains only the
+            # sideways categories; the others keep to the many-identity and development hits
+            m &= source != 'pose'
         if k > 0 and (labels[m].min(initial=1) == labels[m].max(initial=0)):
             print('category %d: too few hits of both kinds, it takes category 0\'s model' % k)
             models.append(models[0])
             continue
-        models.append(fit_category(feats[m], labels[m], args, args.keep if k == 0 else args.keep_turned or args.keep))
+        keep = args.keep if k == 0 else args.keep_turned or args.keep
+        if k >= 3 and args.keep_side:
+            keep = args.keep_side
+        models.append(fit_category(feats[m], labels[m], args, keep))
     payload = ilabs.write_ilabs(models + [models[0]] * (ilabs.CATEGORY_NUMBER - len(models)))
     quantised_all = ilabs.read_ilabs(payload)
     quantised = quantised_all[0]
