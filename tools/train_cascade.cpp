@@ -24,13 +24,19 @@
 //   train_cascade joint-train --boxes TSV --negatives LIST --work DIR
 //                         [--common-stages N] [--branch-stages N] [--band LO:HI] [--minutes M]
 //                         [--train-branches 0,1] [--min-quarter-roll D]
+//                         [--pose-boxes TSV [--yaw-band 25:90] [--yaw-copies 4]
+//                          [--side-hit-rate 0.99] [--side-routing 0.99]]
 //       The roll cascade (tools/lib/BranchTrainer.h): common stages scoring
 //       the upright and the two turned categories, then an upright branch and
 //       a clockwise one (mirrored for counter-clockwise). Positives are the
 //       training photos turned about the face centre (upright within
 //       --upright-roll, turned within the band). Resumes from WORK/joint.txt.
+//       With --pose-boxes (pose-boxes' rows) a one-band state gets the side
+//       band: tables for heads turned sideways on its common stages, then
+//       branch 2 (--train-branches 2) on those heads.
 //   train_cascade joint-model --work DIR --out FILE [--branch-stages N] [--bias B] [--raise K:D,...]
-//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV]
+//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV [--pose-boxes TSV]]
+//                         [--side-bias B]
 //       The engine payload of a joint-train state; --upright-cascade puts a
 //       frontal cascade's stages (train's state) in the upright branch;
 //       --trace adds rejections inside common stage K that keep all but the
