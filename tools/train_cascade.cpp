@@ -922,17 +922,29 @@ int commandTrain(std::map<std::string, std::string> const& a)
 
 constexpr int kBlock = 17;
 
-std::vector<Box> detectBoxes(Gray const& g, int rotation = 0)
+using Block = std::array<int, kBlock>;
+
+// The result blocks of quorin_detect on a copy of the frame (the engine may work in it).
+std::vector<Block> detectBlocks(Gray const& g, int rotation = 0)
 {
     std::vector<uint8_t> frame = g.pixels;
-    std::vector<int> blocks(100 * kBlock, 0);
-    const int n = quorin_detect(frame.data(), g.width, g.height, blocks.data(), 100, rotation);
+    std::vector<Block> blocks(100);
+    const int n = quorin_detect(frame.data(), g.width, g.height, blocks[0].data(), 100, rotation);
+    blocks.resize(static_cast<size_t>(std::clamp(n, 0, 100)));
+    return blocks;
+}
+
+Box boxOf(Block const& b)
+{
+    const double l = b[5], t = b[3], r = b[6], bt = b[4];
+    return {(l + r) / 2, (t + bt) / 2, ((r - l) + (bt - t)) / 2};
+}
+
+std::vector<Box> detectBoxes(Gray const& g, int rotation = 0)
+{
     std::vector<Box> out;
-    for (int k = 0; k < std::clamp(n, 0, 100); ++k) {
-        const int* b = &blocks[static_cast<size_t>(k) * kBlock];
-        const double l = b[5], t = b[3], r = b[6], bt = b[4];
-        out.push_back({(l + r) / 2, (t + bt) / 2, ((r - l) + (bt - t)) / 2});
-    }
+    for (Block const& b : detectBlocks(g, rotation))
+        out.push_back(boxOf(b));
     return out;
 }
 
@@ -1429,21 +1441,18 @@ size_t branchOf(int c, bool* mirrored)
 void extendSide(JointCascade& jc, Miner& miner, TrainConfig const& cfg, SampleSet const& right, SampleSet const& left,
                 double hitRate, std::function<void(std::string const&)> const& say)
 {
-    JointCascade done = jc; // the stages extended so far, band 2 alive alone (for mining)
+    // the stages extended so far with band 2 alive alone: its sums, and the model to mine with
+    JointCascade done = jc;
     done.bands = 2;
     done.common.clear();
     done.branch.clear();
-    auto sideSums = [](std::vector<JointStage> const& stages, const uint32_t* ii, float inv, float* F, bool* alive) {
-        F[0] = F[1] = 0.0f;
-        alive[0] = alive[1] = inv < kGateInverseDeviation;
-        for (JointStage const& s : stages) {
-            for (JointStump const& st : s.stumps) {
-                const size_t b = static_cast<size_t>(JointStump::binOf(st.feature.eval(ii, inv), st.t));
-                F[0] += st.out[3][b];
-                F[1] += st.out[4][b];
-            }
-            alive[0] = alive[0] && F[0] >= s.thresholds[3];
-            alive[1] = alive[1] && F[1] >= s.thresholds[4];
+    auto sideSums = [&done](const uint32_t* ii, float inv, float* F, bool* alive) {
+        float all[15];
+        bool on[15];
+        done.commonSums(ii, inv, all, on);
+        for (int c = 0; c < 2; ++c) {
+            F[c] = all[3 + c];
+            alive[c] = on[3 + c];
         }
     };
     for (size_t k = 0; k < jc.common.size(); ++k) {
@@ -1453,20 +1462,19 @@ void extendSide(JointCascade& jc, Miner& miner, TrainConfig const& cfg, SampleSe
         miner.faceShare = k == 0 ? 0 : 30;
         const size_t variants = miner.mine(CascadeWriter::toBytes(done.toModel()), static_cast<size_t>(cfg.negatives),
                                            cfg.seed * 1000003u + 500 + k, cfg.threads, neg, &searched);
-        std::vector<JointStage> const& prior = done.common;
         SampleSet pos[2];
         float F[2];
         bool ok[2];
         SampleSet const* sets[2] = {&right, &left};
         for (size_t c = 0; c < 2; ++c)
             for (size_t i = 0; i < sets[c]->size(); ++i) {
-                sideSums(prior, sets[c]->integral(i), sets[c]->inverseDeviation(i), F, ok);
+                sideSums(sets[c]->integral(i), sets[c]->inverseDeviation(i), F, ok);
                 if (ok[c])
                     pos[c].addFrom(*sets[c], i);
             }
         std::vector<std::vector<char>> alive(2, std::vector<char>(neg.size(), 0));
         for (size_t i = 0; i < neg.size(); ++i) {
-            sideSums(prior, neg.integral(i), neg.inverseDeviation(i), F, ok);
+            sideSums(neg.integral(i), neg.inverseDeviation(i), F, ok);
             alive[0][i] = ok[0];
             alive[1][i] = ok[1];
         }
@@ -1474,9 +1482,9 @@ void extendSide(JointCascade& jc, Miner& miner, TrainConfig const& cfg, SampleSe
         JointReport rep;
         extendSoftStage(
             st, {&pos[0], &pos[1]}, neg,
-            [&prior, &sideSums](const uint32_t* ii, float inv, float* sums) {
+            [&sideSums](const uint32_t* ii, float inv, float* sums) {
                 bool al[2];
-                sideSums(prior, ii, inv, sums, al);
+                sideSums(ii, inv, sums, al);
             },
             alive, hitRate, &rep);
         // mining sees band 2 alone: the other categories can never pass
@@ -1894,16 +1902,11 @@ int commandRollMeasure(std::map<std::string, std::string> const& a)
                     if (!loadGray(r.path, photo))
                         continue;
                     const Gray g = rotatedAbout(photo, r.box.cx, r.box.cy, sign * angle);
-                    std::vector<uint8_t> frame = g.pixels;
-                    std::vector<int> blocks(100 * kBlock, 0);
-                    const int n = quorin_detect(frame.data(), g.width, g.height, blocks.data(), 100, 0);
                     ++tried;
                     double bestIou = 0;
                     int roll = 0;
-                    for (int k = 0; k < std::clamp(n, 0, 100); ++k) {
-                        const int* b = &blocks[static_cast<size_t>(k) * kBlock];
-                        const Box box{(b[5] + b[6]) / 2.0, (b[3] + b[4]) / 2.0, ((b[6] - b[5]) + (b[4] - b[3])) / 2.0};
-                        const double o = iou(box, r.box);
+                    for (Block const& b : detectBlocks(g)) {
+                        const double o = iou(boxOf(b), r.box);
                         if (o > bestIou) {
                             bestIou = o;
                             roll = b[0];
@@ -2066,20 +2069,18 @@ int commandPoseMeasure(std::map<std::string, std::string> const& a)
             Gray g;
             if (!loadGray(r.path, g))
                 continue;
-            std::vector<int> blocks(100 * kBlock, 0);
-            const int n = std::clamp(quorin_detect(g.pixels.data(), g.width, g.height, blocks.data(), 100, 0), 0, 100);
             // the many-identity photos' turned heads under one key (their yaw is a rough guess)
             const bool pose = r.source == "pointing04";
             std::array<double, 6>& e = byYaw[pose ? static_cast<int>(std::lround(std::fabs(r.yaw))) : 999];
             e[0] += 1;
             bool found = false;
-            for (int k = 0; k < n; ++k) {
-                const int* b = &blocks[static_cast<size_t>(k) * kBlock];
-                const double cx = (b[5] + b[6]) / 2.0, cy = (b[3] + b[4]) / 2.0, side = b[6] - b[5];
+            for (Block const& b : detectBlocks(g)) {
+                const Box box = boxOf(b);
                 const double half = r.box.side / 2; // the labelled box is about the framing's size
-                const bool match = !found && (pose ? std::fabs(cx - r.box.cx) < half && std::fabs(cy - r.box.cy) < half &&
-                                                         side > 0.5 * r.box.side && side < 2 * r.box.side
-                                                   : iou(Box{cx, cy, side}, r.box) >= 0.4);
+                const bool match =
+                    !found && (pose ? std::fabs(box.cx - r.box.cx) < half && std::fabs(box.cy - r.box.cy) < half &&
+                                          box.side > 0.5 * r.box.side && box.side < 2 * r.box.side
+                                    : iou(box, r.box) >= 0.4);
                 if (!match) {
                     e[2] += 1;
                     continue;

@@ -174,9 +174,6 @@ def main(argv=None):
     ap.add_argument('--l2', type=float, default=100.0, help='ridge weight on the standardised feature')
     ap.add_argument('--pose', default=None, help='prefix of dump_hits output on the head-pose photos')
     ap.add_argument('--keep', type=float, default=0.999, help='share of training faces the bias keeps')
-    ap.add_argument('--keep-side', type=float, default=None,
-                    help='share of training faces kept in categories 3 and up, heads turned sideways '
-                         '(default: --keep-turned)')
     ap.add_argument('--keep-turned', type=float, default=None,
                     help='share of training faces kept in categories 1 and up (default: --keep)')
     ap.add_argument('--categories', type=int, default=1,
@@ -218,10 +215,7 @@ def main(argv=None):
             print('category %d: too few hits of both kinds, it takes category 0\'s model' % k)
             models.append(models[0])
             continue
-        keep = args.keep if k == 0 else args.keep_turned or args.keep
-        if k >= 3 and args.keep_side:
-            keep = args.keep_side
-        models.append(fit_category(feats[m], labels[m], args, keep))
+        models.append(fit_category(feats[m], labels[m], args, args.keep if k == 0 else args.keep_turned or args.keep))
     payload = ilabs.write_ilabs(models + [models[0]] * (ilabs.CATEGORY_NUMBER - len(models)))
     quantised_all = ilabs.read_ilabs(payload)
     quantised = quantised_all[0]
