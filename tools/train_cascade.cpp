@@ -35,10 +35,10 @@
 //       band: tables for heads turned sideways on its common stages, then
 //       branch 2 (--train-branches 2) on those heads.
 //   train_cascade joint-model --work DIR --out FILE [--branch-stages N] [--bias B] [--raise K:D,...]
-//                         [--upright-cascade STATE] [--trace Q0,Q1,... --boxes TSV [--pose-boxes TSV]]
-//                         [--side-bias B]
+//                         [--upright-cascade STATE [--upright-stages N]] [--side-bias B]
+//                         [--trace Q0,Q1,... --boxes TSV [--pose-boxes TSV]]
 //       The engine payload of a joint-train state; --upright-cascade puts a
-//       frontal cascade's stages (train's state) in the upright branch;
+//       frontal cascade's stages (train's state; its first N) in the upright branch;
 //       --trace adds rejections inside common stage K that keep all but the
 //       QK quantile of the positives passing them (-1: none).
 //   train_cascade pasted --boxes TSV --negatives LIST [--limit N] [--sizes LO:HI]
@@ -1836,6 +1836,12 @@ int commandJointModel(std::map<std::string, std::string> const& a)
             std::cerr << "cannot read the cascade state " << get(a, "--upright-cascade") << "\n";
             return 1;
         }
+        // --upright-stages N: its first N stages only; the ones after cut
+        // faces turned in the plane by 10 to 20 degrees that no other branch
+        // takes, and the post filter (refitted on the hits) stands in for them
+        const int keep = std::atoi(get(a, "--upright-stages", "-1").c_str());
+        if (keep > 0 && static_cast<size_t>(keep) < upright.stages.size())
+            upright.stages.resize(static_cast<size_t>(keep));
         m.branches[0] = asBranch(upright.toModel());
     }
     return CascadeWriter::writeFile(get(a, "--out"), m) ? 0 : 1;
