@@ -1836,9 +1836,9 @@ int commandJointModel(std::map<std::string, std::string> const& a)
             std::cerr << "cannot read the cascade state " << get(a, "--upright-cascade") << "\n";
             return 1;
         }
-        // --upright-stages N: its first N stages only; the ones after cut
-        // faces turned in the plane by 10 to 20 degrees that no other branch
-        // takes, and the post filter (refitted on the hits) stands in for them
+        // --upright-stages N: its first N stages only, to measure what the
+        // later ones cost faces turned 10 to 20 degrees in the plane (and what
+        // they save in false hits and wrong orientations)
         const int keep = std::atoi(get(a, "--upright-stages", "-1").c_str());
         if (keep > 0 && static_cast<size_t>(keep) < upright.stages.size())
             upright.stages.resize(static_cast<size_t>(keep));
