@@ -2055,8 +2055,18 @@ int commandPoseBoxes(std::map<std::string, std::string> const& a)
 // a face is found when a box's centre lies inside the labelled box at a side
 // within half to twice the framing's. Also the roll of found turned heads and
 // whether the five points lie inside the reported box.
+// A box on a head-pose photo's labelled box (brows to chin, about the framing's size).
+bool onPoseBox(Box const& box, Box const& label)
+{
+    const double half = label.side / 2;
+    return std::fabs(box.cx - label.cx) < half && std::fabs(box.cy - label.cy) < half && box.side > 0.5 * label.side &&
+           box.side < 2 * label.side;
+}
+
 int commandPoseMeasure(std::map<std::string, std::string> const& a)
 {
+    // the many-identity photos' turned heads are counted under one key (their yaw is a rough guess)
+    constexpr int kTurnedHeads = 999;
     Served served;
     if (!served.serve(a))
         return 1;
@@ -2075,18 +2085,13 @@ int commandPoseMeasure(std::map<std::string, std::string> const& a)
             Gray g;
             if (!loadGray(r.path, g))
                 continue;
-            // the many-identity photos' turned heads under one key (their yaw is a rough guess)
             const bool pose = r.source == "pointing04";
-            std::array<double, 6>& e = byYaw[pose ? static_cast<int>(std::lround(std::fabs(r.yaw))) : 999];
+            std::array<double, 6>& e = byYaw[pose ? static_cast<int>(std::lround(std::fabs(r.yaw))) : kTurnedHeads];
             e[0] += 1;
             bool found = false;
             for (Block const& b : detectBlocks(g)) {
                 const Box box = boxOf(b);
-                const double half = r.box.side / 2; // the labelled box is about the framing's size
-                const bool match =
-                    !found && (pose ? std::fabs(box.cx - r.box.cx) < half && std::fabs(box.cy - r.box.cy) < half &&
-                                          box.side > 0.5 * r.box.side && box.side < 2 * r.box.side
-                                    : iou(box, r.box) >= 0.4);
+                const bool match = !found && (pose ? onPoseBox(box, r.box) : iou(box, r.box) >= 0.4);
                 if (!match) {
                     e[2] += 1;
                     continue;
@@ -2104,8 +2109,9 @@ int commandPoseMeasure(std::map<std::string, std::string> const& a)
                 std::printf("  missed %s (yaw %.0f)\n", r.path.c_str(), r.yaw);
         }
         for (auto const& [yaw, e] : byYaw) {
-            char label[64];
-            std::snprintf(label, sizeof label, yaw == 999 ? "many-identity turned heads" : "yaw %2d", yaw);
+            char label[64] = "many-identity turned heads";
+            if (yaw != kTurnedHeads)
+                std::snprintf(label, sizeof label, "yaw %2d", yaw);
             std::printf("mode %d, %s: found %3.0f / %3.0f (%5.1f%%), other boxes %3.0f, mean |roll| %.1f, points inside %.0f%%\n",
                         mode, label, e[1], e[0], 100.0 * e[1] / std::max(1.0, e[0]), e[2],
                         e[1] > 0 ? e[3] / e[1] : 0.0, e[1] > 0 ? 100.0 * e[4] / e[1] : 0.0);

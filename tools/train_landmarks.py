@@ -440,7 +440,7 @@ def main(argv=None):
     ap.add_argument('--report', default=None, help='write the figures as JSON to this file')
     ap.add_argument('--pose', default=None,
                     help='head-pose folder (train_cascade pose-boxes --jsonl): its training people join')
-    ap.add_argument('--pose-copies', type=int, default=3, help='times each head-pose training photo is drawn')
+    ap.add_argument('--pose-copies', type=int, default=1, help='times each head-pose training photo is drawn')
     ap.add_argument('--roll-range', type=float, default=0.0,
                     help='half the augmented draws turn the face uniformly within +-this many degrees '
                          '(0: all turns drawn around upright)')

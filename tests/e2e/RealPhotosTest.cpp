@@ -209,10 +209,6 @@ TEST_F(RealPhotos, RollFollowsAFaceTurnedInThePlane) {
     }
 }
 
-}  // namespace
-
-namespace {
-
 // Heads turned sideways, of people the models never saw (the head-pose
 // photos' report people, read from the shared data where it is present): each
 // is found where its labelled box (brows to chin) is, with the five points
