@@ -115,6 +115,9 @@ void CascadeDetector::initClassifiers(std::string const& modelPath)
     const uint32_t budget = reader.rawSize();
     CascadeStage::checkHeader(reader); // a wrong header is not acted on
 
+    // a model that fails to load leaves no stages to run
+    commonTables = StageTables();
+    branchTables.clear();
     const int32_t commonCount = readCount(reader, budget);
     commonStages.assign(static_cast<size_t>(commonCount), CascadeStage());
     commonFeatures.clear();
@@ -155,6 +158,10 @@ void CascadeDetector::initClassifiers(std::string const& modelPath)
             CascadeStage::scaleFeatures(branchFeatures[0][b].data(), branchFeatures[s][b].data(), count, factor);
         }
     }
+    commonTables.build(commonStages);
+    branchTables.assign(branchStages.size(), StageTables());
+    for (std::size_t b = 0; b < branchStages.size(); ++b)
+        branchTables[b].build(branchStages[b]);
     preparedWidth = 0;
     scaleFeatures.clear();
 }
@@ -303,54 +310,6 @@ void CascadeDetector::ensurePrepared(IN_IMAGE const& image)
     }
 }
 
-namespace {
-
-// Runs `count` stages over one window, their features from `feature`, on
-// `scores`; returns the index of the stage that rejects, or -1. Most stages
-// update the first score alone, and a cascade with N categories updates N:
-// those stay in registers through them and go back to the array for the
-// others (same additions in the same order, so the same results).
-template <int N>
-int runStages(CascadeStage const* stages, int count, ScaleFeatures::Cursor feature, uint32_t const* p,
-              float inverseDeviation, float* scores)
-{
-    float r[N];
-    for (int c = 0; c < N; ++c)
-        r[c] = scores[c];
-    auto store = [&] {
-        for (int c = 0; c < N; ++c)
-            scores[c] = r[c];
-    };
-    for (int i = 0; i < count; ++i, feature.next()) {
-        CascadeStage const& s = stages[i];
-        const float value = feature.value(p, inverseDeviation);
-        bool rejected;
-        if (s.singleScore()) {
-            r[0] += s.binScores[0][s.binOf(value)];
-            rejected = r[0] < s.rejectThreshold[0];
-        } else if (s.scoreCount == N && s.remapFlag == 0) {
-            const int bin = s.binOf(value);
-            int dead = 0;
-            for (int c = 0; c < N; ++c)
-                dead += s.updateOne(r[c], bin, c);
-            rejected = dead == N;
-        } else {
-            store();
-            rejected = s.UpdateScoreAndThreshold(value, scores);
-            for (int c = 0; c < N; ++c)
-                r[c] = scores[c];
-        }
-        if (rejected) {
-            store();
-            return i;
-        }
-    }
-    store();
-    return -1;
-}
-
-} // namespace
-
 bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& window, int scale, float minAverage,
                                ClassifyMode mode, float* score, float* categoryScores, int* stage)
 {
@@ -369,17 +328,16 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     float scores[kMaxCategories] = {};
     uint32_t const* p = image.data + (window.left + image.stride * window.top);
 
-    const int commonCount = static_cast<int>(commonStages.size());
-    const int rejectedAt =
-        commonWidth == 5 ? runStages<5>(commonStages.data(), commonCount, features->common(), p, inverseDeviation, scores)
-                         : runStages<3>(commonStages.data(), commonCount, features->common(), p, inverseDeviation, scores);
+    const int commonCount = commonTables.count();
+    const int rejectedAt = commonWidth == 5 ? commonTables.run<5>(features->common(), p, inverseDeviation, scores)
+                                            : commonTables.run<3>(features->common(), p, inverseDeviation, scores);
     if (rejectedAt >= 0) {
         *score = scores[0];
         *stage = rejectedAt;
         return false;
     }
 
-    const int branches = static_cast<int>(branchStages.size());
+    const int branches = static_cast<int>(branchTables.size());
     if (branches < 2) {
         *score = scores[0];
         *stage = 0;
@@ -396,9 +354,8 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     }
     scores[0] = best;
 
-    std::vector<CascadeStage> const& branch = branchStages[bestIndex];
-    if (runStages<3>(branch.data(), static_cast<int>(branch.size()), features->branch(bestIndex), p, inverseDeviation,
-                  scores) >= 0) {
+    if (branchTables[static_cast<std::size_t>(bestIndex)].run<3>(features->branch(bestIndex), p, inverseDeviation,
+                                                                   scores) >= 0) {
         *score = scores[0];
         *stage = commonCount;
         return false;

@@ -7,6 +7,7 @@
 
 #include "detector/CascadeStage.h"
 #include "detector/ScaleFeatures.h"
+#include "detector/StageTables.h"
 #include "detector/WindowFeature.h"
 #include "image/DetectionWindow.h"
 #include "image/IntegralImage.h"
@@ -114,6 +115,9 @@ public:
     // The features of each scale laid out for the search loop, for the
     // stride of the last preparation (see ScaleFeatures).
     std::vector<ScaleFeatures> scaleFeatures;
+    // the stages as the window loop reads them, built from the vectors above at load
+    StageTables commonTables;
+    std::vector<StageTables> branchTables;
 
 private:
     ScaleFeatures const* featuresFor(int scale, int stride);

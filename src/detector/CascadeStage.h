@@ -43,9 +43,10 @@ public:
     // Written with indices instead of branches, since the branches follow the
     // image and mispredict; the comparisons are the same, so a NaN still
     // lands in bin 6.
-    int binOf(float value) const
+    int binOf(float value) const { return binOf(binThresholds, value); }
+    // The same over seven thresholds laid out elsewhere (StageTables).
+    static int binOf(float const* t, float value)
     {
-        float const* t = binThresholds;
         const int lowerHalf = !(value >= t[3]);
         const int lowerQuarter = !(value >= t[1 + 4 * lowerHalf]);
         const int quarter = 4 * lowerHalf + 2 * lowerQuarter;
@@ -78,10 +79,14 @@ public:
     // adds its bin and dies below its threshold; true when dead afterwards.
     [[gnu::always_inline]] bool updateOne(float& score, int bin, int i) const
     {
+        return updateScore(score, binScores[i][bin], rejectThreshold[i]);
+    }
+    [[gnu::always_inline]] static bool updateScore(float& score, float add, float threshold)
+    {
         if (score <= kDeadScore)
             return true;
-        score += binScores[i][bin];
-        if (score < rejectThreshold[i]) {
+        score += add;
+        if (score < threshold) {
             score = kDeadScore;
             return true;
         }

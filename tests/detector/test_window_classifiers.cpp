@@ -12,6 +12,7 @@
 #include "detector/CascadeStage.h"
 #include "detector/HaarFeature.h"
 #include "detector/ScaleFeatures.h"
+#include "detector/StageTables.h"
 #include "detector/WindowFeature.h"
 #include "support/ScopedModel.h"
 
@@ -239,4 +240,57 @@ TEST(ScaleFeatures, WalkGivesTheFeaturesOwnValuesBitForBit)
                 }
             }
     }
+}
+
+TEST(StageTables, RunGivesTheStagesOwnScoresAndVerdictBitForBit)
+{
+    // Chains mixing one-score stages, stages of the loop's width, wider and
+    // narrower ones, remaps and scoreless stages (which always reject), with
+    // thresholds that kill scores along the way, some below the dead score.
+    std::mt19937 rng(11);
+    std::uniform_real_distribution<float> unit(-1.0f, 1.0f);
+    RandomIntegral img(80, 60, 3);
+    IN_IMAGE const& image = img.image;
+    const int kinds[] = {1, 1, 3, 5, 5, 2, 7, 15, 4};
+    int rejectedSomewhere = 0, passed = 0;
+    for (int trial = 0; trial < 300; ++trial) {
+        std::vector<WindowFeature> features;
+        std::vector<CascadeStage> stages(static_cast<size_t>(4 + rng() % 20));
+        for (CascadeStage& s : stages) {
+            features.push_back(randomFeature(WindowFeature::HAAR, 1 + int(rng() % 3), 36, image.stride, rng));
+            s.scoreCount = rng() % 40 == 0 ? 0 : kinds[rng() % 9];
+            s.remapFlag = rng() % 8 == 0 ? 1 : 0;
+            for (int c = 0; c < s.scoreCount; ++c) {
+                s.remap[c] = static_cast<int32_t>(rng() % static_cast<unsigned>(s.scoreCount));
+                s.rejectThreshold[c] = rng() % 10 == 0 ? -25.0f : -2.0f + unit(rng);
+                for (float& b : s.binScores[c])
+                    b = unit(rng);
+            }
+            float* t = s.binThresholds;
+            for (int i = 0; i < CascadeStage::kBinThresholds; ++i)
+                t[i] = 3.0f * unit(rng);
+            std::sort(t, t + CascadeStage::kBinThresholds);
+        }
+        ScaleFeatures laidOut;
+        ASSERT_TRUE(laidOut.build(features, {}, image.stride));
+        StageTables tables;
+        tables.build(stages);
+        for (const int width : {3, 5}) {
+            const int offset = int(rng() % 40) + image.stride * int(rng() % 20);
+            const float deviation = 2e-5f;
+            float expected[kMaxCategories] = {}, got[kMaxCategories] = {};
+            int expectedAt = -1;
+            for (size_t i = 0; i < stages.size() && expectedAt < 0; ++i)
+                if (stages[i].UpdateScoreAndThreshold(features[i].Eval(image, deviation, offset), expected))
+                    expectedAt = static_cast<int>(i);
+            const int at = width == 3 ? tables.run<3>(laidOut.common(), image.data + offset, deviation, got)
+                                      : tables.run<5>(laidOut.common(), image.data + offset, deviation, got);
+            ASSERT_EQ(at, expectedAt) << "trial " << trial << ", width " << width;
+            for (int c = 0; c < kMaxCategories; ++c)
+                ASSERT_TRUE(sameBits(got[c], expected[c])) << "trial " << trial << ", score " << c;
+            (at < 0 ? passed : rejectedSomewhere) += 1;
+        }
+    }
+    EXPECT_GT(passed, 30);
+    EXPECT_GT(rejectedSomewhere, 30);
 }
