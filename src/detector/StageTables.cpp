@@ -8,6 +8,7 @@ void StageTables::build(std::vector<CascadeStage> const& stages)
     kinds_.clear();
     lines_.clear();
     general_.clear();
+    singleOnly_ = true;
     std::size_t total = 0;
     for (CascadeStage const& s : stages)
         if (s.remapFlag == 0 && s.scoreCount > 0)
@@ -23,6 +24,7 @@ void StageTables::build(std::vector<CascadeStage> const& stages)
             continue;
         }
         kinds_.push_back(static_cast<uint8_t>(k));
+        singleOnly_ = singleOnly_ && k == 1;
         for (int t = 0; t < CascadeStage::kBinThresholds; ++t)
             rec[t] = s.binThresholds[t];
         if (k == 1) {

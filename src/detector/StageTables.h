@@ -31,6 +31,10 @@ public:
     int run(ScaleFeatures::Cursor feature, uint32_t const* p, float inverseDeviation, float* scores) const;
 
 private:
+    // The chain when every stage it lays out updates one score (a branch):
+    // that score stays in a register.
+    int runSingle(ScaleFeatures::Cursor feature, uint32_t const* p, float inverseDeviation, float* scores) const;
+
     struct alignas(64) Line {
         float v[16];
     };
@@ -39,7 +43,36 @@ private:
     std::vector<uint8_t> kinds_;
     std::vector<Line> lines_;
     std::vector<CascadeStage> general_;
+    bool singleOnly_ = true;
 };
+
+inline int StageTables::runSingle(ScaleFeatures::Cursor feature, uint32_t const* p, float inverseDeviation,
+                                  float* scores) const
+{
+    float r = scores[0];
+    float const* rec = lines_.empty() ? nullptr : lines_.front().v;
+    CascadeStage const* general = general_.data();
+    const int n = count();
+    for (int i = 0; i < n; ++i, feature.next()) {
+        const float value = feature.value(p, inverseDeviation);
+        bool rejected;
+        if (kinds_[static_cast<std::size_t>(i)] == 1) {
+            r += rec[8 + CascadeStage::binOf(rec, value)];
+            rejected = r < rec[7];
+            rec += 16;
+        } else {
+            scores[0] = r;
+            rejected = (general++)->UpdateScoreAndThreshold(value, scores);
+            r = scores[0];
+        }
+        if (rejected) {
+            scores[0] = r;
+            return i;
+        }
+    }
+    scores[0] = r;
+    return -1;
+}
 
 // Offsets in a record of a stage with k > 1 scores, padded to whole vectors
 // of four: bin thresholds [0, 7), reject thresholds from 8, bin b's scores
@@ -55,6 +88,8 @@ int StageTables::run(ScaleFeatures::Cursor feature, uint32_t const* p, float inv
     // minus infinity and are masked out of the verdict.
     typedef float F4 __attribute__((vector_size(16)));
     typedef int32_t I4 __attribute__((vector_size(16)));
+    if (singleOnly_)
+        return runSingle(feature, p, inverseDeviation, scores);
     constexpr int W = (N + 3) / 4;
     static_assert(4 * W <= kMaxCategories, "the scores array holds the padding lanes");
     F4 r[W];

@@ -246,7 +246,8 @@ TEST(StageTables, RunGivesTheStagesOwnScoresAndVerdictBitForBit)
 {
     // Chains mixing one-score stages, stages of the loop's width, wider and
     // narrower ones, remaps and scoreless stages (which always reject), with
-    // thresholds that kill scores along the way, some below the dead score.
+    // thresholds that kill scores along the way, some below the dead score;
+    // every third chain one-score stages and remaps only, as a branch.
     std::mt19937 rng(11);
     std::uniform_real_distribution<float> unit(-1.0f, 1.0f);
     RandomIntegral img(80, 60, 3);
@@ -256,9 +257,10 @@ TEST(StageTables, RunGivesTheStagesOwnScoresAndVerdictBitForBit)
     for (int trial = 0; trial < 300; ++trial) {
         std::vector<WindowFeature> features;
         std::vector<CascadeStage> stages(static_cast<size_t>(4 + rng() % 20));
+        const bool branch = trial % 3 == 0;
         for (CascadeStage& s : stages) {
             features.push_back(randomFeature(WindowFeature::HAAR, 1 + int(rng() % 3), 36, image.stride, rng));
-            s.scoreCount = rng() % 40 == 0 ? 0 : kinds[rng() % 9];
+            s.scoreCount = rng() % 40 == 0 ? 0 : branch ? 1 : kinds[rng() % 9];
             s.remapFlag = rng() % 8 == 0 ? 1 : 0;
             for (int c = 0; c < s.scoreCount; ++c) {
                 s.remap[c] = static_cast<int32_t>(rng() % static_cast<unsigned>(s.scoreCount));
