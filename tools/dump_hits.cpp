@@ -53,9 +53,10 @@ namespace fs = std::filesystem;
 namespace {
 
 const char* kUsage =
-    "usage: dump_hits [--data DIR] [--out PREFIX] [--model FILE] [--turns A,B,...]\n"
+    "usage: dump_hits --out PREFIX [--data DIR] [--model FILE] [--turns A,B,...]\n"
     "  --data DIR     data cache (default $QUORIN_DATA_DIR or ~/.cache/quorin)\n"
-    "  --out PREFIX   writes PREFIX.tsv and PREFIX.f32 (default DIR/labels/hits)\n"
+    "  --out PREFIX   writes PREFIX.tsv and PREFIX.f32 (required: the cache's own labels/hits belong to\n"
+    "                 scripts/mine-hits.sh, which checks them against the built-in cascade)\n"
     "  --model FILE   a cascade payload to search with instead of the built-in one\n"
     "  --turns LIST   also search each face photo turned by these angles (degrees,\n"
     "                 clockwise) about its centre, the teacher faces turned with it\n"
@@ -240,8 +241,10 @@ int main(int argc, char** argv)
         std::cerr << kUsage;
         return 2;
     }
-    if (out.empty())
-        out = data + "/labels/hits";
+    if (out.empty()) {
+        std::cerr << kUsage;
+        return 2;
+    }
     std::ifstream labels(data + "/labels/faces.jsonl");
     if (!labels) {
         std::cerr << "dump_hits: no teacher labels in " << data << "/labels (run label_faces first)\n";
