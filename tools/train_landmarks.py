@@ -12,8 +12,8 @@ Each sample is rebuilt as the library sees it: the frame shrunk by nearest neigh
 the work size the hit was found at, the hit's rectangle cut out and sampled to an s x s
 patch with the locator's index rule, and the patch scaled to sum to 211676. Training
 samples are augmented (rotation up to 30 degrees about the face, box shift and size
-jitter, mirroring with swapped labels, brightness, contrast, blur, noise). The net is one
-sigmoid hidden layer and ten linear outputs (x, y of the five points in units of the
+jitter, mirroring with swapped labels, brightness, contrast, blur, noise). The net has
+sigmoid hidden layers (--hidden) and ten linear outputs (x, y of the five points in units of the
 rectangle), trained in float with torch, then quantised with tools/netwriter.py so that
 no 32-bit accumulator can overflow; the held-out ("report") figures are computed with the
 reference integer forward pass, i.e. bit for bit what the library computes.
@@ -415,7 +415,7 @@ def run_tag(args):
 
 def main(argv=None):
     ap = argparse.ArgumentParser(description=__doc__.splitlines()[0],
-                                 epilog='Defaults reproduce models/mdnb.bin from the mined hits and labels.')
+                                 epilog='models/README.md (mdnb.bin) gives the options that remake the shipped payload.')
     ap.add_argument('--data', default=tp.data_dir(), help='development data cache')
     ap.add_argument('--faces', default=None, help='many-identity folder (default DATA/faces-data)')
     ap.add_argument('--five-points', default=os.path.join(HERE, '..', '..', 'shared', 'data', 'faces',
