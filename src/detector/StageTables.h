@@ -13,9 +13,15 @@
 // of 64-byte lines holding the bin thresholds, the reject thresholds and the
 // bin scores bin by bin, so a stage touches two or three lines where the
 // CascadeStage object (640 bytes, scores category by category) touched up to
-// six, and the scores of one bin load as vectors. Stages that remap (or update no score) keep their CascadeStage and run
-// through it. Results are those of CascadeStage::UpdateScoreAndThreshold bit
-// for bit: the same additions in the same order.
+// six, and the scores of one bin load as vectors. Stages that remap (or update
+// no score) keep their CascadeStage and run through it. Results are those of
+// CascadeStage::UpdateScoreAndThreshold bit for bit: the same additions in the
+// same order.
+//
+// Records: a one-score stage is one line, bin thresholds [0, 7), the reject
+// threshold at 7, the bin scores [8, 16). A stage of k > 1 scores is padded to
+// w = ceil(k / 4) vectors of four: bin thresholds [0, 7), reject thresholds
+// from 8, bin b's scores from 8 + 4w + 4w * b, whole lines in all.
 class StageTables {
 public:
     // Lays out `stages`; throws std::bad_alloc when memory runs out.
@@ -74,9 +80,7 @@ inline int StageTables::runSingle(ScaleFeatures::Cursor feature, uint32_t const*
     return -1;
 }
 
-// Offsets in a record of a stage with k > 1 scores, padded to whole vectors
-// of four: bin thresholds [0, 7), reject thresholds from 8, bin b's scores
-// from 8 + 4w + 4w * b, with w = ceil(k / 4); the record fills whole lines.
+// The vectors of four and the floats of a stage record of k scores.
 inline int stageVectors(int k) { return (k + 3) / 4; }
 inline int stageRecordFloats(int k) { return k == 1 ? 16 : 16 * ((8 + 36 * stageVectors(k) + 15) / 16); }
 
