@@ -2051,10 +2051,6 @@ int commandPoseBoxes(std::map<std::string, std::string> const& a)
     return 0;
 }
 
-// Faces found by yaw on the head-pose report people through quorin_detect:
-// a face is found when a box's centre lies inside the labelled box at a side
-// within half to twice the framing's. Also the roll of found turned heads and
-// whether the five points lie inside the reported box.
 // A box on a head-pose photo's labelled box (brows to chin, about the framing's size).
 bool onPoseBox(Box const& box, Box const& label)
 {
@@ -2063,6 +2059,10 @@ bool onPoseBox(Box const& box, Box const& label)
            box.side < 2 * label.side;
 }
 
+// Faces found by yaw on the head-pose report people through quorin_detect:
+// a face is found when a box's centre lies inside the labelled box at a side
+// within half to twice the framing's. Also the roll of found turned heads and
+// whether the five points lie inside the reported box.
 int commandPoseMeasure(std::map<std::string, std::string> const& a)
 {
     // the many-identity photos' turned heads are counted under one key (their yaw is a rough guess)

@@ -133,11 +133,6 @@ void CascadeDetector::initClassifiers(std::string const& modelPath)
     }
 
     const int branches = commonCount > 0 ? commonStages.back().scoreCount : 0;
-    // the scores kept in registers through the common stages
-    commonWidth = 3;
-    for (CascadeStage const& s : commonStages)
-        if (s.remapFlag == 0 && s.scoreCount > 3)
-            commonWidth = 5;
     branchStages.clear();
     branchStages.resize(static_cast<size_t>(branches));
     branchFeatures.clear();
@@ -329,7 +324,7 @@ bool CascadeDetector::classify(IN_IMAGE const& image, DetectionWindow const& win
     uint32_t const* p = image.data + (window.left + image.stride * window.top);
 
     const int commonCount = commonTables.count();
-    const int rejectedAt = commonWidth == 5 ? commonTables.run<5>(features->common(), p, inverseDeviation, scores)
+    const int rejectedAt = commonTables.width() > 3 ? commonTables.run<5>(features->common(), p, inverseDeviation, scores)
                                             : commonTables.run<3>(features->common(), p, inverseDeviation, scores);
     if (rejectedAt >= 0) {
         *score = scores[0];

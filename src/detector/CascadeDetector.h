@@ -104,7 +104,6 @@ public:
     int32_t stepX[kScales] = {};
     int32_t stepY[kScales] = {};
     std::vector<CascadeStage> commonStages;
-    int commonWidth = 3; // scores the stage loop keeps in registers: 3, or 5 when a common stage updates more
     std::vector<std::vector<WindowFeature>> commonFeatures;
     std::vector<std::vector<CascadeStage>> branchStages;
     std::vector<std::vector<std::vector<WindowFeature>>> branchFeatures;

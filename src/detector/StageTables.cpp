@@ -1,5 +1,6 @@
 #include "detector/StageTables.h"
 
+#include <algorithm>
 #include <cstddef>
 #include <limits>
 
@@ -9,6 +10,7 @@ void StageTables::build(std::vector<CascadeStage> const& stages)
     lines_.clear();
     general_.clear();
     singleOnly_ = true;
+    width_ = 0;
     std::size_t total = 0;
     for (CascadeStage const& s : stages)
         if (s.remapFlag == 0 && s.scoreCount > 0)
@@ -25,6 +27,7 @@ void StageTables::build(std::vector<CascadeStage> const& stages)
         }
         kinds_.push_back(static_cast<uint8_t>(k));
         singleOnly_ = singleOnly_ && k == 1;
+        width_ = std::max(width_, k);
         for (int t = 0; t < CascadeStage::kBinThresholds; ++t)
             rec[t] = s.binThresholds[t];
         if (k == 1) {

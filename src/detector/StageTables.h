@@ -28,6 +28,9 @@ public:
     void build(std::vector<CascadeStage> const& stages);
 
     int count() const { return static_cast<int>(kinds_.size()); }
+    // The most scores a laid-out stage updates (0 for none): the width the
+    // caller's run<N> should keep in registers.
+    int width() const { return width_; }
 
     // Runs the chain over one window, its features from `feature`, on
     // `scores` (15 floats); returns the index of the stage that rejects, or -1.
@@ -50,6 +53,7 @@ private:
     std::vector<Line> lines_;
     std::vector<CascadeStage> general_;
     bool singleOnly_ = true;
+    int width_ = 0;
 };
 
 inline int StageTables::runSingle(ScaleFeatures::Cursor feature, uint32_t const* p, float inverseDeviation,
